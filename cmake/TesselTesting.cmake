@@ -1,0 +1,37 @@
+# tessel_add_test(<name>
+#                 SOURCES <file>...
+#                 [LIBS <target>...]        what the program links besides GoogleTest
+#                 [PG]                      the sandbox starts a private PostgreSQL server
+#                 [TIMEOUT <seconds>]
+#                 [LABELS <label>...])
+#
+# Builds a GoogleTest program and registers it with CTest. Every test program
+# runs in its own sandbox (tests/sandbox/tessel-sandbox): a private mount
+# namespace in which the library's fixed system paths are fresh tmpfs
+# directories, passwd/group/shadow are the test copies, /dev/log is captured
+# and, with PG, a private PostgreSQL server answers on the default socket.
+find_package(GTest REQUIRED)
+
+set(TESSEL_SANDBOX ${PROJECT_SOURCE_DIR}/tests/sandbox/tessel-sandbox)
+
+function(tessel_add_test name)
+  cmake_parse_arguments(T "PG" "TIMEOUT" "SOURCES;LIBS;LABELS" ${ARGN})
+  add_executable(${name} ${T_SOURCES})
+  target_link_libraries(${name} PRIVATE ${T_LIBS} GTest::gtest GTest::gtest_main Threads::Threads)
+  if(TARGET tessel_test_support)
+    target_link_libraries(${name} PRIVATE tessel_test_support)
+  endif()
+  set(sandbox_args)
+  if(T_PG)
+    list(APPEND sandbox_args --pg)
+  endif()
+  add_test(NAME ${name}
+           COMMAND ${TESSEL_SANDBOX} ${sandbox_args} -- $<TARGET_FILE:${name}>)
+  if(NOT T_TIMEOUT)
+    set(T_TIMEOUT 600)
+  endif()
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${T_TIMEOUT})
+  if(T_LABELS)
+    set_tests_properties(${name} PROPERTIES LABELS "${T_LABELS}")
+  endif()
+endfunction()
