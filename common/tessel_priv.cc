@@ -51,8 +51,11 @@ RootSection::~RootSection() {
     std::lock_guard<std::mutex> guard(gMutex);
     bool ok = true;
     if (0 == --gDepth) {
-        ok = Switch(m_szModule, m_line, "resuid", true, gSavedEuid);
-        ok = Switch(m_szModule, m_line, "resgid", false, gSavedEgid) && ok;
+        // The group goes back first, while the effective uid is still 0: once
+        // the uid is a user's again, the process may set its effective gid only
+        // to its real or saved gid, which the caller's own group need not be.
+        ok = Switch(m_szModule, m_line, "resgid", false, gSavedEgid);
+        ok = Switch(m_szModule, m_line, "resuid", true, gSavedEuid) && ok;
         if (!ok) {
             syslog(LOG_AUTH | LOG_ERR, "%s:%d ERROR: LEAVECriticalSection", m_szModule, m_line);
         }

@@ -4,8 +4,9 @@
  * happens inside one of these and nowhere else.
  *
  * Entering switches the effective gid and then the effective uid to 0
- * (setresgid(-1, 0, -1), setresuid(-1, 0, -1)); leaving switches the uid and
- * then the gid back. Each switch is logged at LOG_AUTH|LOG_INFO as
+ * (setresgid(-1, 0, -1), setresuid(-1, 0, -1)); leaving switches the gid and
+ * then the uid back (the gid must be restored while still root, or a caller
+ * whose saved gid is not its own group could not get its group back). Each switch is logged at LOG_AUTH|LOG_INFO as
  * "<module>:<line> WARNING: setresgid(-1, 0, -1)" (or ERROR with the reason,
  * followed by "ERROR: ENTERCriticalSection" / "ERROR: LEAVECriticalSection");
  * errno is 0 afterwards, or 1 when a switch failed. A failed switch never
