@@ -80,7 +80,9 @@ QUOR_EXPORT BOOL QLIBCFileCheckDir(const char *szPath); /* a directory (follows 
  * flock()s szPath (created 0644 when missing) in the given mode, retrying until
  * timeoutUs microseconds have passed (0: one try; negative: wait for ever).
  * Returns 1 with *pFd holding the locked descriptor (release with
- * flock(fd, LOCK_UN) and close), 0 on time-out, -1 on error.
+ * flock(fd, LOCK_UN) and close), 0 on time-out (QLIBC_ERR_LOCK_TIMEOUT), -1 on
+ * error. *pFd is -1 unless locked. A symbolic link or anything but a regular
+ * file at szPath is an error.
  */
 QUOR_EXPORT int QLIBCFileLockTimeByFile(const char *szPath, int mode, long long timeoutUs, int *pFd);
 
@@ -94,14 +96,27 @@ QUOR_EXPORT int QLIBCFileGetKeyValue(const char *szPath, const char *szKey, char
 QUOR_EXPORT int QLIBCFileSetKeyValue(const char *szPath, const char *szKey, const char *szValue);
 
 /* ---- base64 (standard alphabet, '=' padding) ----------------------------- */
-/* Encodes nIn bytes into szOut (terminated); blLineBreak adds a newline every 76 characters. */
+/*
+ * Encodes nIn bytes into szOut (terminated); blLineBreak puts a newline after
+ * every 76 characters except at the end. Needs cbOut >= 4 * ceil(nIn / 3) + 1
+ * (plus the newlines); a shorter buffer fails as a bad parameter.
+ */
 QUOR_EXPORT BOOL QLIBCBase64SzEncodeFull(const unsigned char *pIn, size_t nIn, char *szOut,
                                          size_t cbOut, BOOL blLineBreak);
-/* Decodes; *pnOut is the capacity of pOut on entry and the decoded length on return. */
+/*
+ * Decodes; *pnOut is the capacity of pOut on entry and the decoded length on
+ * return. Blanks and line breaks are skipped; anything else that is not a
+ * whole number of padded groups, or data that does not fit, fails as a bad
+ * parameter with pOut's bytes unspecified but never written past *pnOut.
+ */
 QUOR_EXPORT BOOL QLIBCBase64Decode(const char *szIn, size_t nIn, char *pOut, size_t *pnOut);
 
 /* ---- text ---------------------------------------------------------------- */
-/* Upper-cases UTF-8 text into szOut (terminated); 0, or -1 on bad input or short buffer. */
+/*
+ * Upper-cases UTF-8 text into szOut (terminated) by the simple (one code point
+ * to one code point) Unicode mapping, so the length in bytes may change.
+ * 0, or -1 on invalid UTF-8 or a short buffer.
+ */
 QUOR_EXPORT int QLIBCUTF8StrToUpper(const char *szIn, char *szOut, size_t cbOut);
 
 /* ---- processes ----------------------------------------------------------- */
@@ -132,19 +147,23 @@ QUOR_EXPORT BOOL QLIBServiceIsRunning(const char *szService);
 typedef struct _tag_QUORUSER QUORUSER; /* defined in quor.h */
 
 /* The display (real) name of a user: the full-name part of the GECOS field,
- * or the login name when that is empty. 0, or -1 for an unknown user. */
+ * or the login name when that is empty. 0, or -1 for an unknown user or a
+ * buffer too short for the whole name. */
 QUOR_EXPORT int QLIBUserRealNameGet(const char *szUser, char *szBuf, size_t cbBuf);
-/* Pushes the decimal gid of every group the user belongs to (primary first)
- * onto *ppList. Returns the count, or -1 for an unknown user. */
+/* Pushes the decimal gid of every group the user belongs to (primary first,
+ * each once) onto *ppList, an allocated list. Returns the count pushed, or -1
+ * for an unknown user. */
 QUOR_EXPORT int QLIBGroupInfoListGet(const char *szUser, QLIBSZLIST **ppList);
 
 /* Called once per user; a negative result stops the enumeration. */
 typedef int (*QLIBUSERENUMCALLBACK)(const QUORUSER *pUser, void *pData);
 /*
- * Enumerates the users of authType (only AUTH_LOCAL: the accounts of the
- * passwd database) whose name contains szQuery (NULL: all), skipping the
- * first offset and returning at most limit (-1: no limit), in passwd order.
- * Returns the number of users handed to the callback, or -1.
+ * Enumerates the users of authType (only AUTH_LOCAL: the accounts of the local
+ * passwd file; any other type is a bad parameter) whose name contains szQuery
+ * (ignoring ASCII case; NULL: all), skipping the first offset and returning at
+ * most limit (-1: no limit), in passwd order. The record passed to the
+ * callback is valid during the call only. Returns the number of users handed
+ * to the callback (the one that stopped it included), or -1.
  */
 QUOR_EXPORT int QLIBUserInfoEnum(int authType, const char *szQuery, int offset, int limit,
                                  QLIBUSERENUMCALLBACK callback, void *pData);
@@ -154,16 +173,18 @@ typedef struct _tag_QLIBPLUGIN QLIBPLUGIN;
 
 /*
  * Loads the plug-in module szPath (a shared object; a path without "/" is
- * looked for in each directory of pSearchPath) and checks that it implements
- * the interface version major.minor. See quor/qlib_plugin.h for what a module
- * exports. 0 with *ppPlugin set, or -1.
+ * looked for in each directory of pSearchPath, in order, and nowhere else),
+ * checks that it implements the interface version major.minor and runs its
+ * init. See quor/qlib_plugin.h for what a module exports and how arguments
+ * reach it. 0 with *ppPlugin set, or -1 (QLIBC_ERR_NOT_FOUND, QLIBC_ERR_PLUGIN).
  */
 QUOR_EXPORT int QLIBPluginInit(const char *szPath, const QLIBSZLIST *pSearchPath, int major, int minor,
                                QLIBPLUGIN **ppPlugin);
 QUOR_EXPORT BOOL QLIBPluginHasInit(const QLIBPLUGIN *pPlugin);
 QUOR_EXPORT int QLIBPluginSetArg(QLIBPLUGIN *pPlugin, const char *szName, const char *szValue);
 QUOR_EXPORT int QLIBPluginSetArgByInt(QLIBPLUGIN *pPlugin, const char *szName, int value);
-/* Runs the module's action; its result (negative on failure). */
+/* Runs the module's action with the arguments set since the last action;
+ * its result (negative on failure, recorded as QLIBC_ERR_PLUGIN). */
 QUOR_EXPORT int QLIBPluginAction(const char *szAction, QLIBPLUGIN *pPlugin);
 /* Unloads the module and frees the plug-in; 0, or -1. */
 QUOR_EXPORT int QLIBPluginExit(QLIBPLUGIN *pPlugin);
