@@ -33,9 +33,12 @@ extern "C" {
 
 /* ---- users and groups (NSS and the shadow database) ---------------------- */
 /*
- * A user record. szRealName and szMail come from the GECOS field: the full
- * name is its first comma-separated part, the mail address its last part when
- * that part holds an "@" (empty otherwise).
+ * A user record. szRealName and szMail come from the GECOS field
+ * ("full name,room,work phone,home phone,other"): the full name is its first
+ * comma-separated part (possibly empty), the mail address its last part when
+ * that part holds an "@" (empty otherwise), which is where account tools keep
+ * it ("Alice Able,Room 1,555-0101,,alice@example.com"). A GECOS of one part
+ * is the full name, and the mail address too when it holds an "@".
  */
 struct _tag_QUORUSER {
     char *szName;
@@ -57,9 +60,11 @@ QUOR_EXPORT int QUORUserGetByUID(uid_t uid, QUORUSER **ppUser);
 QUOR_EXPORT int QUORUserGet(const char *szName, QUORUSER **ppUser);
 QUOR_EXPORT void QUORUserFree(QUORUSER *pUser);
 /*
- * 1 when the account has expired (the shadow entry's account expiry date lies
- * in the past), 0 when it has not (or has no expiry date), -1 for an unknown
- * user or when the shadow database cannot be read (needs root).
+ * 1 when the account has expired (the shadow entry's account expiry day,
+ * counted in days since 1970-01-01, is today or earlier: the account is closed
+ * from that day on, as login and PAM see it), 0 when it has not (or has no
+ * expiry date), -1 for a user without a shadow entry or when the shadow
+ * database cannot be read (needs root).
  */
 QUOR_EXPORT int QUORUserCheckExpired(const char *szName);
 QUOR_EXPORT int QUORGroupGetByGID(gid_t gid, QUORGROUP **ppGroup);
