@@ -3,6 +3,7 @@
 #define QUOR_PLATFORM_H
 
 #include "qlib.h"
+#include "qlib_plugin.h"
 #include "quor.h"
 #include "quor_db.h"
 #include "quor_web.h"
