@@ -88,11 +88,15 @@ QUOR_EXPORT int QLIBCFileLockTimeByFile(const char *szPath, int mode, long long 
 
 /*
  * Reads key from a file of KEY="value" (or KEY=value) lines; '#' starts a
- * comment line. Returns the value's length (the value copied, always
- * terminated, cut to cbBuf - 1), or -1 when the file or key is missing.
+ * comment line, a value may contain '=', and when a key appears twice the last
+ * line wins. Returns the value's full length (the value copied, always
+ * terminated, cut to cbBuf - 1, so a result >= cbBuf means it was cut), or -1
+ * when the file or key is missing (QLIBC_ERR_NOT_FOUND) or unreadable.
  */
 QUOR_EXPORT int QLIBCFileGetKeyValue(const char *szPath, const char *szKey, char *szBuf, size_t cbBuf);
-/* Sets key in such a file, creating the file when missing; 0, or -1. */
+/* Sets key in such a file (as KEY="value"), creating the file (0644) when
+ * missing. The file is replaced atomically, keeping its other lines, mode and
+ * owner; a value with a line break is refused. 0, or -1. */
 QUOR_EXPORT int QLIBCFileSetKeyValue(const char *szPath, const char *szKey, const char *szValue);
 
 /* ---- base64 (standard alphabet, '=' padding) ----------------------------- */

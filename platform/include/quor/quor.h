@@ -14,6 +14,9 @@
  *
  * A missing file or key falls back to the defaults of a fresh machine: the
  * "homes" share at /volume1/homes, user homes enabled, not a removable model.
+ * A switch is on for "yes" and off for "no" (any case); another value keeps
+ * the default. A file that exists but cannot be read, or a share path that is
+ * not absolute, is an error rather than a reason to use the defaults.
  * A share's volume is the "/volumeN" prefix of its path; its temporary
  * directory is that volume followed by "/@tmp".
  */
@@ -92,9 +95,13 @@ QUOR_EXPORT BOOL QUORIsRemovableModel(void);
 typedef struct _tag_QUORVOLINFO {
     char szVolPath[64];   /* "/volumeN" */
     int volNumber;        /* N */
-    char szRelPath[4096]; /* the rest of the path below the volume, "" for the volume itself */
+    char szRelPath[4096]; /* the rest of the path from its "/", "" for the volume itself;
+                             szVolPath followed by szRelPath is the path */
 } QUORVOLINFO;
-/* Splits a path into its volume and the rest; 0, or -1 when it is on no volume. */
+/* Splits a path into its volume and the rest; 0, or -1 when it is on no volume.
+ * A path is on volume N when it starts with "/volume" and N (decimal, at least
+ * 1, no leading zeros) followed by "/" or its end: "/volume1x" and "/volumes"
+ * are on none. A path with a ".." component is on none either. */
 QUOR_EXPORT int VolumePathParseEx(const char *szPath, QUORVOLINFO *pVolInfo);
 
 /* ---- directories and files ----------------------------------------------- */
@@ -103,7 +110,9 @@ QUOR_EXPORT int VolumePathParseEx(const char *szPath, QUORVOLINFO *pVolInfo);
  * directory it creates gets owner uid, group gid (either may be (uid_t)-1 /
  * (gid_t)-1 to leave it as created) and mode; directories that already exist
  * are left alone. When pCreated is not NULL, the created directories are
- * pushed onto *pCreated, outermost first. 0, or -1.
+ * pushed onto *pCreated, outermost first. 0, or -1: a failure removes the
+ * directories this call created; a path with a "." or ".." component, or a
+ * mode beyond 07777, is refused.
  */
 QUOR_EXPORT int QUORFSMkdirP(const char *szPath, QLIBSZLIST **pCreated, BOOL blParents, uid_t uid,
                              gid_t gid, mode_t mode);
@@ -113,8 +122,10 @@ typedef struct _tag_QUORFILECOPYARG {
     BOOL blKeepOwner;    /* give the copy the source's owner and group */
     BOOL blKeepMode;     /* give the copy the source's permission bits (else 0600) */
 } QUORFILECOPYARG;
-/* Copies a regular file through a temporary file and a rename; 0, or -1. A
- * NULL pArg means overwrite, keep neither owner nor mode. */
+/* Copies a regular file through a temporary file in the destination's
+ * directory (fsync'ed, then renamed into place), so a failure leaves the
+ * destination as it was; 0, or -1. A NULL pArg means overwrite, keep neither
+ * owner nor mode. A directory is never replaced. */
 QUOR_EXPORT int QUORFileCopy(const char *szSrc, const char *szDest, const QUORFILECOPYARG *pArg);
 
 #ifdef __cplusplus

@@ -19,7 +19,10 @@ typedef struct DBResult_tag DBResult_tag;
 /*
  * Connects to database szDB as szUser. A NULL host means the default local
  * socket; NULL arguments fall back to libpq's standard environment (PGHOST,
- * PGPORT, PGUSER, ...) and defaults. Returns the connection, or NULL.
+ * PGPORT, PGUSER, ...) and defaults. Every session (also one reopened after
+ * the server dropped it) uses client encoding UTF8 and
+ * standard_conforming_strings on, which QUORDBEscapeStringEX3 relies on.
+ * Returns the connection, or NULL (the reason goes to the system log).
  */
 QUOR_EXPORT DBConnect_tag *QUORDBConnect(const char *szHost, const char *szUser, const char *szPassword,
                                          const char *szDB);
@@ -40,11 +43,16 @@ QUOR_EXPORT void QUORDBFreeResult(DBResult_tag *pResult);
 /*
  * Fills the markers of szTemplate in order from the arguments that follow:
  *   "@QUOR:VAR"   const char *       the text escaped for a quoted SQL literal
- *                                     (the template supplies the quotes)
+ *                                     (the template supplies the quotes): each
+ *                                     quote doubled, backslashes kept as they
+ *                                     are (standard strings)
  *   "@QUOR:LLINT" long long          decimal
  *   "@QUOR:INT"   int                decimal
+ * Markers match exactly: "@QUOR:VAR_info" is "@QUOR:VAR" followed by "_info";
+ * filled text is not searched for markers again.
  * Returns a malloc()ed statement (free with free()), or NULL when a text is
- * not valid UTF-8 or memory runs out.
+ * NULL or not valid UTF-8 (overlong forms and surrogates included) or memory
+ * runs out.
  */
 QUOR_EXPORT char *QUORDBEscapeStringEX3(int dbType, const char *szTemplate, ...);
 

@@ -19,8 +19,10 @@ public:
      * case-insensitive); "application/octet-stream" when unknown. */
     std::string GetMimeType(const char *szFileName);
     /* Writes "Content-Type:", "Content-Length:" and an empty line, then the
-     * file's bytes, to standard output. 0, or -1 (nothing written when the file
-     * cannot be opened). */
+     * file's bytes, to standard output through stdio (after whatever the
+     * caller printed). A NULL or empty type is taken from the file name. 0, or
+     * -1 (nothing written when the file cannot be opened or is not a regular
+     * file, or when the type holds a line break). */
     int Output(const char *szPath, const char *szMimeType);
 };
 
