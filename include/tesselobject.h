@@ -36,8 +36,10 @@ public:
     TESSEL_OBJECT(const TESSEL_OBJECT &) = delete;
     TESSEL_OBJECT &operator=(const TESSEL_OBJECT &) = delete;
 
-    /* Resets the fields; owner becomes 4294967295, person an empty object,
-     * path_info and perm are kept. */
+    /* Resets the fields: texts empty, times 0, JSON arrays and objects
+     * emptied (other JSON values null); owner becomes 4294967295 (no user),
+     * person an empty object; path_info and perm are kept. A new record
+     * instead has owner 0 and every JSON field null. */
     void clear();
 
     std::string get_ns() const;
@@ -110,12 +112,31 @@ public:
     bool swap_person(Json::Value &v);
 
     /*
-     * Writes the fields chosen by jField into jRet (which must be an object).
+     * Writes the fields chosen by jField into jRet, which must be an object
+     * (otherwise false, with 1015 on the error stack).
+     *
+     * ns, id, category, version, perm, parent_id, owner (as {"uid",
+     * "display_name"}, the name empty for an unknown user), ctime and mtime
+     * are written unless jField turns them off with a false value.
+     * commit_msg is written when jField asks for it with a true value.
+     * metatext, text, person, metabinary_info and binary_info: true writes
+     * the whole field; an object such as {"title": true} writes the key as an
+     * object holding those members marked true that the field has.
      * The acl is written only when asked for and the written perm is "owner"
-     * or "rw", or blShowAcl is true.
+     * or "rw", or blShowAcl is true. path_info, extra_info and err are never
+     * written. A jField that is not an object selects the defaults.
      */
     bool toJson(const Json::Value &jField, Json::Value &jRet, bool blShowAcl) const;
-    /* Fills the record from a JSON object. */
+    /*
+     * Fills the fields named in jVal: ns, id, category, version, parent_id,
+     * commit_msg, metatext, text, acl, owner, ctime and mtime as given (owner
+     * -1 is 4294967295); metabinary_info and binary_info are stored as a JSON
+     * string holding the given value's JSON text. Other keys are ignored.
+     * False when jVal is not an object or a value cannot become its field
+     * (owner, ctime, mtime not numbers; a text field given an array or
+     * object); the record is then unchanged and the platform error state is
+     * QLIBC_ERR_BAD_PARAMETERS.
+     */
     bool fromJson(const Json::Value &jVal);
 
     /* Reads one object with the requester's permission word. */
@@ -146,7 +167,8 @@ public:
     /* Frees the chain. */
     void clear();
 
-    /* Reads one object and, on success, makes it the only record. */
+    /* Reads one object and, on success, makes it the only record; on
+     * failure the list is left as it was. */
     bool GetObject(const Json::Value &jParm);
     /* Reads every record (or the ids of jParm into an empty list); jsResult
      * maps each id to whether it was read. */

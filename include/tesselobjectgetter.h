@@ -3,9 +3,10 @@
  *
  * Text and JSON getters write the field (JSON fields as JSON text) into szBuf
  * with snprintf semantics: cut to cbBuf - 1 bytes and always terminated.
- * Every getter returns 0, or -1 on a bad argument; a bad argument is logged
- * and recorded in the platform error state (QLIBCErrGet() == 0xD00), not on
- * the library's error stack.
+ * Every getter returns 0, or -1 on a bad argument (a NULL buffer, cbBuf not
+ * above 0, a NULL record or value pointer); a bad argument is logged and
+ * recorded in the platform error state (QLIBCErrGet() == 0xD00), not on the
+ * library's error stack, and the buffer is left untouched.
  */
 #ifndef TESSEL_OBJECT_GETTER_H
 #define TESSEL_OBJECT_GETTER_H

@@ -1,8 +1,9 @@
 /*
  * Plain-function setters of TESSEL_OBJECT for applications: the record first,
  * the value second. JSON setters parse the text and store whatever the parse
- * produced. Each returns 0, or -1 on a bad argument (logged and recorded in the
- * platform error state, 0xD00).
+ * produced (null for text that is not JSON). Each returns 0, or -1 on a bad
+ * argument (a NULL record or text; logged and recorded in the platform error
+ * state, 0xD00) or when the record has lost its data block.
  */
 #ifndef TESSEL_OBJECT_SETTER_H
 #define TESSEL_OBJECT_SETTER_H
