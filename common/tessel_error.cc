@@ -48,7 +48,6 @@ const TESSEL_ERROR_STRING rgErrorString[TESSEL_ERROR_STRING_COUNT] = {
     {1028, "No application privilege for the namespace.", NULL, NULL},
     {1029, "Update configuration file failed.", NULL, NULL},
     {1030, "Object owner is disabled or expired.", NULL, NULL},
-    {1031, "Object ID already exists.", NULL, NULL},
 };
 
 }  // extern "C"
@@ -56,10 +55,17 @@ const TESSEL_ERROR_STRING rgErrorString[TESSEL_ERROR_STRING_COUNT] = {
 namespace {
 
 // Created empty on the thread's first use, destroyed when the thread exits.
+// The application holds a writable reference to it; whatever it stored there,
+// the error calls keep working on an array.
 Json::Value &ThreadStack() {
     thread_local Json::Value jErrMsg(Json::arrayValue);
+    if (!jErrMsg.isArray()) {
+        jErrMsg = Json::Value(Json::arrayValue);
+    }
     return jErrMsg;
 }
+
+constexpr size_t kMaxBlindSize = 1u << 20;
 
 // vsnprintf into a heap buffer that grows until the text fits. Any allocation
 // failure yields an empty text rather than a visible error.
@@ -79,6 +85,12 @@ std::string FormatMessage(const char *szFormat, va_list ap) {
         va_end(aq);
         if (0 <= n && static_cast<size_t>(n) < size) {
             break;
+        }
+        // A negative result without a size (an encoding error) would repeat
+        // at every size: give up once doubling has reached 1 MiB.
+        if (0 > n && size >= kMaxBlindSize) {
+            free(szBuf);
+            return std::string();
         }
         size = (0 <= n) ? static_cast<size_t>(n) + 1 : size * 2;
         char *szGrown = static_cast<char *>(realloc(szBuf, size));
@@ -101,12 +113,24 @@ Json::Value MakeFrame(const char *szFile, int line, const char *szFormat, va_lis
     return jFrame;
 }
 
+// Frames may have been edited by the application: a member of the wrong type
+// prints as a missing one instead of throwing from inside a report.
 const char *FrameText(const Json::Value &jFrame, const char *szKey) {
-    return jFrame.isMember(szKey) ? jFrame[szKey].asCString() : "----";
+    return (jFrame.isObject() && jFrame[szKey].isString()) ? jFrame[szKey].asCString() : "----";
 }
 
 int FrameLine(const Json::Value &jFrame) {
-    return jFrame.isMember("line") ? jFrame["line"].asInt() : 0;
+    return (jFrame.isObject() && jFrame["line"].isInt()) ? jFrame["line"].asInt() : 0;
+}
+
+// Frame 0's code, or false when it has none.
+bool RootCode(const Json::Value &jStack, int &code) {
+    const Json::Value &jRoot = jStack[0u];
+    if (!jRoot.isObject() || !jRoot.isMember("code")) {
+        return false;
+    }
+    code = jRoot["code"].isInt() ? jRoot["code"].asInt() : -1;
+    return true;
 }
 
 }  // namespace
@@ -137,10 +161,8 @@ int TesselErrCodeGet(void) {
     if (jStack.empty()) {
         return 0;
     }
-    if (!jStack[0u].isMember("code")) {
-        return -1;
-    }
-    return jStack[0u]["code"].asInt();
+    int code = -1;
+    return RootCode(jStack, code) ? code : -1;
 }
 
 void TesselErrSyslog(void) {
@@ -154,8 +176,8 @@ void TesselErrSyslog(void) {
         syslog(LOG_ERR, "%s:%d   %s (%s:%d)", kTesselModule, __LINE__, FrameText(jFrame, "msg"),
                FrameText(jFrame, "file"), FrameLine(jFrame));
     }
-    if (jStack[0u].isMember("code")) {
-        int code = jStack[0u]["code"].asInt();
+    int code = 0;
+    if (RootCode(jStack, code)) {
         for (const TESSEL_ERROR_STRING &entry : rgErrorString) {
             if (entry.code == code) {
                 syslog(LOG_ERR, "%s:%d   ErrNo=[%d] (%s)", kTesselModule, __LINE__, code, entry.message);
@@ -175,8 +197,8 @@ void TesselErrPrint(FILE *stream) {
         const Json::Value &jFrame = jStack[i];
         fprintf(out, "  %s (%s:%d)\n", FrameText(jFrame, "msg"), FrameText(jFrame, "file"), FrameLine(jFrame));
     }
-    if (jStack[0u].isMember("code")) {
-        int code = jStack[0u]["code"].asInt();
+    int code = 0;
+    if (RootCode(jStack, code)) {
         for (const TESSEL_ERROR_STRING &entry : rgErrorString) {
             if (entry.code == code) {
                 fprintf(out, "  ErrNo=[%d] (%s)\n", code, entry.message);
