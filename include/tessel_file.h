@@ -20,7 +20,10 @@
 TESSEL_EXPORT bool TesselEncode(const unsigned char *szIn, size_t nIn, std::string &strOut,
                                 bool blBase64Only = false);
 TESSEL_EXPORT bool TesselEncode(const std::string &strIn, std::string &strOut, bool blBase64Only = false);
-/* Decodes into the zero-filled part of szOut (nOut bytes). */
+/*
+ * Decodes into szOut, at most nOut bytes. The decoded length is not returned:
+ * pass a zero-filled buffer when the data's end must be found afterwards.
+ */
 TESSEL_EXPORT bool TesselDecode(const std::string &strIn, unsigned char *szOut, size_t nOut,
                                 bool blBase64Only = false);
 /* Decodes into a text; the result stops at its first zero byte. */
