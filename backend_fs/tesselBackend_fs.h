@@ -1,0 +1,44 @@
+/*
+ * The file-system store ("fs"): the authoritative copy of every object, one
+ * directory per object, with its versioned fields in a Git repository of its
+ * own. Made by CreateFsBackend through the backend registry; one instance per
+ * operation and thread.
+ *
+ * Listing and child queries belong to the index store: List, ListChildren
+ * and HasChildren answer "nothing" here, silently, so that a caller may ask
+ * both stores the same question.
+ */
+#ifndef TESSEL_BACKEND_FS_TESSELBACKEND_FS_H
+#define TESSEL_BACKEND_FS_TESSELBACKEND_FS_H
+
+#include <string>
+
+#include <json/value.h>
+
+#include "tessel_backend.h"
+
+class TESSEL_BACKEND_FS : public TESSEL_BACKEND_OP {
+public:
+    TESSEL_BACKEND_FS();
+    ~TESSEL_BACKEND_FS() override;
+
+    /* The store's own operations. */
+    bool Get(const Json::Value &jParm, TESSEL_OBJECT *pObject) override;
+    bool Download(const Json::Value &jParm) override;
+    bool Set(const Json::Value &jParm, std::string &strNewVer) override;
+    bool FieldRename(const Json::Value &jParm, std::string &strNewVer) override;
+    bool Create(const Json::Value &jParm, std::string &strNewID, std::string &strNewVer) override;
+    bool Delete(const Json::Value &jParm) override;
+    bool VersionGet(const Json::Value &jParm, TESSEL_OBJECT_VERSION *pVersion) override;
+    bool VersionDiff(const Json::Value &jParm, Json::Value &jDiff) override;
+    int VersionList(const Json::Value &jParm, TESSEL_OBJECT_VERSION **addrPHead, unsigned int &total,
+                    unsigned int &listable_total) override;
+    bool SetOwner(const Json::Value &jParm, std::string &strNewVer) override;
+
+    /* The index store's questions: no records, no children. */
+    int List(const Json::Value &jParm, TESSEL_OBJECT **addrPHead, unsigned int &total) override;
+    bool ListChildren(const Json::Value &jParm, Json::Value &jsIds) override;
+    bool HasChildren(const Json::Value &jParm) override;
+};
+
+#endif /* TESSEL_BACKEND_FS_TESSELBACKEND_FS_H */
