@@ -30,7 +30,6 @@ namespace {
 // stuck holder turns into an error instead of a hung request.
 constexpr int kLockTries = 6;
 constexpr useconds_t kLockPauseUs = 500000;
-constexpr long long kLockPatienceUs = static_cast<long long>(kLockTries - 1) * kLockPauseUs;
 
 struct FreeDeleter {
     void operator()(void *p) const { free(p); }
@@ -215,13 +214,13 @@ bool TesselRawToFile(const std::string &strData, const std::string &strPath) {
 
     // The lock is taken on the target itself, so that every writer and reader
     // of this file in any process meets on it.
-    int fdLock = -1;
-    int ret = QLIBCFileLockTimeByFile(strPath.c_str(), QLIBC_FILE_LOCK_EX, kLockPatienceUs, &fdLock);
-    if (1 != ret) {
-        TESSEL_CHECK_APPEND(QLIBC_ERR_FILE_OPEN == QLIBCErrGet(), "0 > fdLock", false);
+    int fdLock = open(strPath.c_str(), O_WRONLY | O_CREAT | O_NONBLOCK | O_CLOEXEC, 0600);
+    TESSEL_CHECK_APPEND(0 > fdLock, "0 > fdLock", false);
+    if (!FlockPatiently(fdLock, LOCK_EX)) {
         // Busy for too long, or flock itself failed: logged, but left for the
         // caller to report.
-        TESSEL_LOG_FAILED("1 != QLIBCFileLockTimeByFile(strPath.c_str(), QLIBC_FILE_LOCK_EX, kLockPatienceUs, &fdLock)");
+        TESSEL_LOG_FAILED("!FlockPatiently(fdLock, LOCK_EX)");
+        close(fdLock);
         return false;
     }
 

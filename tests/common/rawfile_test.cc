@@ -262,7 +262,7 @@ TEST_F(RawFile, WriterGivesUpOnAHeldLock) {
     EXPECT_EQ("old", ReadAll(target_));
     EXPECT_EQ(std::vector<std::string>{"basic.json"}, Entries());
     EXPECT_TRUE(jStack.empty()) << "a busy file is left for the caller to report";
-    EXPECT_TRUE(tessel_test::WaitForSyslog("Failed [1 != QLIBCFileLockTimeByFile(", mark).has_value());
+    EXPECT_TRUE(tessel_test::WaitForSyslog("Failed [!FlockPatiently(fdLock, LOCK_EX)]", mark).has_value());
     EXPECT_EQ(0, holder.Release());
 }
 
