@@ -2,7 +2,6 @@
 // no leftovers, and serialisation with other processes through flock.
 #include <dirent.h>
 #include <fcntl.h>
-#include <poll.h>
 #include <signal.h>
 #include <sys/file.h>
 #include <sys/resource.h>
@@ -13,15 +12,16 @@
 #include <algorithm>
 #include <chrono>
 #include <filesystem>
-#include <fstream>
-#include <sstream>
+#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include <gtest/gtest.h>
 
+#include "support/process_holding.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 #include "tessel_error.h"
 #include "tessel_file.h"
 
@@ -29,18 +29,8 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 using Seconds = std::chrono::duration<double>;
-
-std::string ReadAll(const std::string &path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
-
-void WriteAll(const std::string &path, const std::string &text) {
-    std::ofstream out(path, std::ios::binary | std::ios::trunc);
-    out << text;
-}
+using tessel_test::ReadFile;
+using tessel_test::WriteFile;
 
 // The last frame of this thread's stack, or "" when it is empty.
 std::string LastFrameMsg() {
@@ -62,70 +52,27 @@ bool OnFreshThread(Fn fn, Json::Value &jStack) {
 
 // Another process holding flock(op) on a file, until Release() or, with
 // holdMs >= 0, for that long.
-class LockHolder {
+class LockHolder : public tessel_test::ProcessHolding {
 public:
-    LockHolder(const std::string &path, int op, int holdMs = -1) {
-        int ready[2];
-        int release[2];
-        if (0 != pipe(ready) || 0 != pipe(release)) {
-            return;
-        }
-        pid_ = fork();
-        if (0 == pid_) {
-            close(ready[0]);
-            close(release[1]);
-            int fd = open(path.c_str(), O_RDONLY);
-            if (0 > fd || 0 != flock(fd, op)) {
-                _exit(1);
-            }
-            if (1 != write(ready[1], "L", 1)) {
-                _exit(2);
-            }
-            struct pollfd pfd = {release[0], POLLIN, 0};
-            poll(&pfd, 1, holdMs);  // EOF on the pipe, or the time is up
-            _exit(0);
-        }
-        close(ready[1]);
-        close(release[0]);
-        releaseFd_ = release[1];
-        char c = 0;
-        locked_ = (1 == read(ready[0], &c, 1));
-        close(ready[0]);
-    }
-    ~LockHolder() { Release(); }
-    bool locked() const { return locked_; }
-    int Release() {
-        if (0 <= releaseFd_) {
-            close(releaseFd_);
-            releaseFd_ = -1;
-        }
-        int status = -1;
-        if (0 < pid_) {
-            waitpid(pid_, &status, 0);
-            pid_ = -1;
-        }
-        return status;
-    }
-
-private:
-    pid_t pid_ = -1;
-    int releaseFd_ = -1;
-    bool locked_ = false;
+    LockHolder(const std::string &path, int op, int holdMs = -1)
+        : ProcessHolding(
+              [path, op] {
+                  int fd = open(path.c_str(), O_RDONLY);
+                  return 0 <= fd && 0 == flock(fd, op);
+              },
+              holdMs) {}
+    bool locked() const { return ready(); }
 };
 
 class RawFile : public ::testing::Test {
 protected:
     void SetUp() override {
         ASSERT_TRUE(tessel_test::InSandbox()) << "run through ctest: this test writes under /tmp";
-        char tmpl[] = "/tmp/rawfile.XXXXXX";
-        ASSERT_NE(nullptr, mkdtemp(tmpl));
-        dir_ = tmpl;
+        scratch_ = std::make_unique<tessel_test::ScratchDir>();
+        ASSERT_TRUE(scratch_->ok());
+        dir_ = scratch_->path();
         ASSERT_EQ(0, chmod(dir_.c_str(), 0755));
         target_ = dir_ + "/basic.json";
-    }
-    void TearDown() override {
-        std::error_code ec;
-        std::filesystem::remove_all(dir_, ec);
     }
     // The names in the test directory, sorted.
     std::vector<std::string> Entries() const {
@@ -136,6 +83,8 @@ protected:
         std::sort(names.begin(), names.end());
         return names;
     }
+    // Made in SetUp, once it is known that /tmp is the sandbox's.
+    std::unique_ptr<tessel_test::ScratchDir> scratch_;
     std::string dir_;
     std::string target_;
 };
@@ -143,7 +92,7 @@ protected:
 TEST_F(RawFile, NewFileGetsTheDataAndMkstempMode) {
     const std::string data("line one\n\0binary\xff", 18);
     ASSERT_TRUE(TesselRawToFile(data, target_));
-    EXPECT_EQ(data, ReadAll(target_));
+    EXPECT_EQ(data, ReadFile(target_));
     struct stat st;
     ASSERT_EQ(0, stat(target_.c_str(), &st));
     EXPECT_EQ(0600u, st.st_mode & 07777);
@@ -164,11 +113,11 @@ TEST_F(RawFile, RewriteKeepsOwnerGroupAndMode) {
     };
     for (const Case &c : cases) {
         SCOPED_TRACE(std::to_string(c.uid) + ":" + std::to_string(c.gid));
-        WriteAll(target_, "old content that is longer than the new");
+        WriteFile(target_, "old content that is longer than the new");
         ASSERT_EQ(0, chown(target_.c_str(), c.uid, c.gid));
         ASSERT_EQ(0, chmod(target_.c_str(), c.mode));
         ASSERT_TRUE(TesselRawToFile("{\"v\":2}", target_));
-        EXPECT_EQ("{\"v\":2}", ReadAll(target_));
+        EXPECT_EQ("{\"v\":2}", ReadFile(target_));
         struct stat st;
         ASSERT_EQ(0, stat(target_.c_str(), &st));
         EXPECT_EQ(c.uid, st.st_uid);
@@ -204,7 +153,7 @@ TEST_F(RawFile, BadTargetsFailWithAFrameAndLeaveNothing) {
 // A user who may read the file but not write the directory cannot make the
 // temporary file: the old content stays.
 TEST_F(RawFile, TemporaryFileNotCreatable) {
-    WriteAll(target_, "old");
+    WriteFile(target_, "old");
     ASSERT_EQ(0, chown(target_.c_str(), tessel_test::kUidAlice, tessel_test::kGidUsers));
     ASSERT_EQ(0, chmod(target_.c_str(), 0644));
     int status = tessel_test::RunInChild([&] {
@@ -218,7 +167,7 @@ TEST_F(RawFile, TemporaryFileNotCreatable) {
         return ("0 > fdTemp" == LastFrameMsg()) ? 0 : 12;
     });
     EXPECT_EQ(0, status);
-    EXPECT_EQ("old", ReadAll(target_));
+    EXPECT_EQ("old", ReadFile(target_));
     EXPECT_EQ(std::vector<std::string>{"basic.json"}, Entries());
 }
 
@@ -226,7 +175,7 @@ TEST_F(RawFile, TemporaryFileNotCreatable) {
 // target nor a temporary file; a new target does not appear at all.
 TEST_F(RawFile, WriteFailureLeavesNoPartialFile) {
     const std::string other = dir_ + "/new.json";
-    WriteAll(target_, "old");
+    WriteFile(target_, "old");
     int status = tessel_test::RunInChild([&] {
         signal(SIGXFSZ, SIG_IGN);
         struct rlimit limit = {16, 16};
@@ -243,12 +192,12 @@ TEST_F(RawFile, WriteFailureLeavesNoPartialFile) {
         return 0;
     });
     EXPECT_EQ(0, status);
-    EXPECT_EQ("old", ReadAll(target_));
+    EXPECT_EQ("old", ReadFile(target_));
     EXPECT_EQ(std::vector<std::string>{"basic.json"}, Entries());
 }
 
 TEST_F(RawFile, WriterGivesUpOnAHeldLock) {
-    WriteAll(target_, "old");
+    WriteFile(target_, "old");
     LockHolder holder(target_, LOCK_EX);
     ASSERT_TRUE(holder.locked());
     size_t mark = tessel_test::SyslogMark();
@@ -259,7 +208,7 @@ TEST_F(RawFile, WriterGivesUpOnAHeldLock) {
     EXPECT_FALSE(ok);
     EXPECT_GE(elapsed.count(), 2.0);
     EXPECT_LT(elapsed.count(), 10.0);
-    EXPECT_EQ("old", ReadAll(target_));
+    EXPECT_EQ("old", ReadFile(target_));
     EXPECT_EQ(std::vector<std::string>{"basic.json"}, Entries());
     EXPECT_TRUE(jStack.empty()) << "a busy file is left for the caller to report";
     EXPECT_TRUE(tessel_test::WaitForSyslog("Failed [!FlockPatiently(fdLock, LOCK_EX)]", mark).has_value());
@@ -267,7 +216,7 @@ TEST_F(RawFile, WriterGivesUpOnAHeldLock) {
 }
 
 TEST_F(RawFile, WriterWaitsForAShortLock) {
-    WriteAll(target_, "old");
+    WriteFile(target_, "old");
     LockHolder holder(target_, LOCK_EX, 1000);
     ASSERT_TRUE(holder.locked());
     Clock::time_point t0 = Clock::now();
@@ -275,12 +224,12 @@ TEST_F(RawFile, WriterWaitsForAShortLock) {
     Seconds elapsed = Clock::now() - t0;
     EXPECT_GE(elapsed.count(), 0.8);
     EXPECT_LT(elapsed.count(), 10.0);
-    EXPECT_EQ("new", ReadAll(target_));
+    EXPECT_EQ("new", ReadFile(target_));
     EXPECT_EQ(0, holder.Release());
 }
 
 TEST_F(RawFile, ReaderGivesUpOnAWriterButSharesWithReaders) {
-    WriteAll(target_, "{\"a\":1}");
+    WriteFile(target_, "{\"a\":1}");
     {
         LockHolder reader(target_, LOCK_SH);
         ASSERT_TRUE(reader.locked());
@@ -307,7 +256,7 @@ TEST_F(RawFile, ConcurrentWritersNeverShowAPartialFile) {
     constexpr size_t kSize = 256 * 1024;
     constexpr int kWriters = 3;
     constexpr int kWrites = 15;
-    WriteAll(target_, std::string(kSize, '0'));
+    WriteFile(target_, std::string(kSize, '0'));
     std::vector<pid_t> pids;
     for (int w = 0; w < kWriters; ++w) {
         pid_t pid = fork();
@@ -355,7 +304,7 @@ TEST_F(RawFile, ReadGivesTheRawTextUnparsed) {
         {std::string("not json \0 with a zero byte", 27)},
     };
     for (const Case &c : cases) {
-        WriteAll(target_, c.content);
+        WriteFile(target_, c.content);
         Json::Value jOut;
         ASSERT_TRUE(TesselRawFromFile(jOut, target_));
         ASSERT_TRUE(jOut.isString());
@@ -394,7 +343,7 @@ TEST_F(RawFile, JsonToFileWritesCompactText) {
     jVal["a"][1u] = true;
     jVal["n"] = Json::Value();
     ASSERT_TRUE(TesselJsonToFile(jVal, target_));
-    EXPECT_EQ("{\"a\":[1,true],\"b\":\"caf\xc3\xa9\",\"n\":null}", ReadAll(target_));
+    EXPECT_EQ("{\"a\":[1,true],\"b\":\"caf\xc3\xa9\",\"n\":null}", ReadFile(target_));
     EXPECT_FALSE(TesselJsonToFile(jVal, dir_ + "/missing/x.json"));
 }
 

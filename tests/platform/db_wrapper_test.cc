@@ -16,6 +16,7 @@
 #include "quor/qlib.h"
 #include "quor/quor_db.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
@@ -238,7 +239,7 @@ TEST(ServiceState, PgsqlRunsWhenTheDefaultServerAnswers) {
     EXPECT_TRUE(QLIBServiceIsRunning("pgsql"));
     // The check honours libpq's environment: a socket directory without a
     // server is a stopped service.
-    quor_test::ScratchDir empty;
+    tessel_test::ScratchDir empty;
     ASSERT_TRUE(empty.ok());
     {
         ScopedEnv host("PGHOST", empty.path().c_str());

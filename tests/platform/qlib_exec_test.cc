@@ -10,12 +10,12 @@
 
 #include <gtest/gtest.h>
 
-#include "qlib_test_tempdir.h"
 #include "quor/qlib.h"
+#include "support/scratch.h"
 
 namespace {
 
-using qlib_test::TempDir;
+using tessel_test::ScratchDir;
 
 TEST(Exec, ReturnsTheExitStatus) {
     EXPECT_EQ(0, QLIBCExec("/bin/true", NULL));
@@ -32,7 +32,7 @@ TEST(Exec, PassesArgumentsVerbatimWithoutAShell) {
     EXPECT_EQ(1, QLIBCExec("/usr/bin/test", "a b", "=", "a", NULL));
     EXPECT_EQ(0, QLIBCExec("/usr/bin/test", "*", "=", "*", NULL));
 
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string target = dir.file("made by touch; rm -rf x");
     EXPECT_EQ(0, QLIBCExec("/usr/bin/touch", target.c_str(), NULL));
@@ -40,7 +40,7 @@ TEST(Exec, PassesArgumentsVerbatimWithoutAShell) {
 }
 
 TEST(Exec, ReportsProgramsThatCannotRunOrDie) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string script = dir.file("not-executable");
     std::ofstream(script) << "#!/bin/sh\nexit 0\n";

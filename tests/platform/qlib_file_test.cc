@@ -1,7 +1,6 @@
 // File checks and flock() locks with time-outs, with real second processes
 // holding or asking for the lock.
 #include <fcntl.h>
-#include <signal.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -13,14 +12,15 @@
 
 #include <gtest/gtest.h>
 
-#include "qlib_test_tempdir.h"
 #include "quor/qlib.h"
+#include "support/process_holding.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
 using Clock = std::chrono::steady_clock;
-using qlib_test::TempDir;
+using tessel_test::ScratchDir;
 
 long long ElapsedUs(Clock::time_point since) {
     return std::chrono::duration_cast<std::chrono::microseconds>(Clock::now() - since).count();
@@ -32,71 +32,35 @@ void Release(int fd) {
 }
 
 // Another process holding a lock on a file. It takes the lock, says so, and
-// keeps it until Release() (or, with holdMs, for that long), writing
-// markerPath just before it lets go.
+// keeps it until Finish() (or, with holdMs, for that long), writing
+// markerPath just before it lets go; the lock goes when the process ends.
 class LockHolder {
 public:
-    LockHolder(const std::string &path, int mode, int holdMs = -1, const std::string &markerPath = "") {
-        int ready[2];
-        int release[2];
-        if (0 != pipe(ready) || 0 != pipe(release)) {
-            return;
-        }
-        pid_ = fork();
-        if (0 == pid_) {
-            close(ready[0]);
-            close(release[1]);
-            int fd = -1;
-            char ok = (1 == QLIBCFileLockTimeByFile(path.c_str(), mode, 0, &fd)) ? 'y' : 'n';
-            if (1 != write(ready[1], &ok, 1) || 'y' != ok) {
-                _exit(1);
-            }
-            if (holdMs >= 0) {
-                usleep(static_cast<useconds_t>(holdMs) * 1000);
-            } else {
-                char c;
-                while (read(release[0], &c, 1) > 0) {
-                }
-            }
-            if (!markerPath.empty()) {
-                std::ofstream(markerPath) << "released\n";
-            }
-            Release(fd);
-            _exit(0);
-        }
-        close(ready[1]);
-        close(release[0]);
-        release_ = release[1];
-        char ok = 'n';
-        locked_ = (1 == read(ready[0], &ok, 1) && 'y' == ok);
-        close(ready[0]);
-    }
-    ~LockHolder() {
-        if (pid_ > 0) {
-            Finish();
-        }
-    }
-    bool locked() const { return locked_; }
+    LockHolder(const std::string &path, int mode, int holdMs = -1, const std::string &markerPath = "")
+        : holding_(
+              [path, mode] {
+                  int fd = -1;
+                  return 1 == QLIBCFileLockTimeByFile(path.c_str(), mode, 0, &fd);
+              },
+              holdMs,
+              [markerPath] {
+                  if (!markerPath.empty()) {
+                      std::ofstream(markerPath) << "released\n";
+                  }
+              }) {}
+    bool locked() const { return holding_.ready(); }
     // Lets go of the lock and reaps the process; true when it ended cleanly.
     bool Finish() {
-        if (release_ >= 0) {
-            close(release_);
-            release_ = -1;
-        }
-        int status = 0;
-        bool clean = pid_ > 0 && waitpid(pid_, &status, 0) == pid_ && WIFEXITED(status) && 0 == WEXITSTATUS(status);
-        pid_ = -1;
-        return clean;
+        int status = holding_.Release();
+        return -1 != status && WIFEXITED(status) && 0 == WEXITSTATUS(status);
     }
 
 private:
-    pid_t pid_ = -1;
-    int release_ = -1;
-    bool locked_ = false;
+    tessel_test::ProcessHolding holding_;
 };
 
 TEST(FileChecks, TellFilesDirectoriesAndLinksApart) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     std::ofstream(dir.file("plain")) << "x";
     ASSERT_EQ(0, symlink(dir.path().c_str(), dir.file("dirlink").c_str()));
@@ -127,7 +91,7 @@ TEST(FileChecks, RecordBadArguments) {
 }
 
 TEST(FileLock, CreatesAMissingLockFileThatOtherUsersCanOpen) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("new.lock");
     mode_t old = umask(077);
@@ -144,7 +108,7 @@ TEST(FileLock, CreatesAMissingLockFileThatOtherUsersCanOpen) {
 }
 
 TEST(FileLock, ExclusiveLockOfAnotherProcessTimesOut) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("held.lock");
     LockHolder holder(path, QLIBC_FILE_LOCK_EX);
@@ -175,7 +139,7 @@ TEST(FileLock, ExclusiveLockOfAnotherProcessTimesOut) {
 }
 
 TEST(FileLock, OurLockKeepsAnotherProcessOutUntilReleased) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("ours.lock");
     int fd = -1;
@@ -198,7 +162,7 @@ TEST(FileLock, OurLockKeepsAnotherProcessOutUntilReleased) {
 }
 
 TEST(FileLock, SharedLocksAreShared) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("shared.lock");
     LockHolder holder(path, QLIBC_FILE_LOCK_SH);
@@ -215,7 +179,7 @@ TEST(FileLock, SharedLocksAreShared) {
 }
 
 TEST(FileLock, WaitsForTheHolderToLetGo) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("wait.lock");
     // A time-out long enough, then no time-out at all.
@@ -232,7 +196,7 @@ TEST(FileLock, WaitsForTheHolderToLetGo) {
 }
 
 TEST(FileLock, RefusesLinksAndNonRegularFiles) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     std::ofstream(dir.file("target")) << "keep";
     ASSERT_EQ(0, symlink(dir.file("target").c_str(), dir.file("link.lock").c_str()));
@@ -250,7 +214,7 @@ TEST(FileLock, RefusesLinksAndNonRegularFiles) {
 }
 
 TEST(FileLock, RecordsBadArguments) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string path = dir.file("args.lock");
     int fd = -1;

@@ -9,13 +9,13 @@
 
 #include <gtest/gtest.h>
 
-#include "qlib_test_tempdir.h"
 #include "quor/platform.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
-using qlib_test::TempDir;
+using tessel_test::ScratchDir;
 
 std::string ModuleName(const std::string &variant) { return "libquor_test_plugin_" + variant + ".so"; }
 std::string ModulePath(const std::string &variant) {
@@ -49,7 +49,7 @@ struct SzList {
 };
 
 TEST(Plugin, RunsActionsWithTheArgumentsSetForThem) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string out = dir.file("out");
     const std::string path = ModulePath("good");
@@ -110,7 +110,7 @@ TEST(Plugin, ChecksTheInterfaceVersion) {
 }
 
 TEST(Plugin, LooksBareNamesUpInTheSearchPathOnly) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     SzList search;
     search.Push(dir.path());  // exists, but holds no module
@@ -134,7 +134,7 @@ TEST(Plugin, LooksBareNamesUpInTheSearchPathOnly) {
 }
 
 TEST(Plugin, RefusesBrokenModules) {
-    TempDir dir;
+    ScratchDir dir;
     ASSERT_TRUE(dir.ok());
     const std::string notElf = dir.file("text.so");
     std::ofstream(notElf) << "not a shared object\n";

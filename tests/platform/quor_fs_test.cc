@@ -16,14 +16,15 @@
 #include "platform/quor_test_files.h"
 #include "quor/quor.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
 using quor_test::Exists;
 using quor_test::ListDir;
 using quor_test::PlatformErrorIs;
-using quor_test::ReadFile;
-using quor_test::WriteFile;
+using tessel_test::ReadFile;
+using tessel_test::WriteFile;
 
 constexpr uid_t kNoUid = static_cast<uid_t>(-1);
 constexpr gid_t kNoGid = static_cast<gid_t>(-1);
@@ -34,7 +35,7 @@ protected:
         if (!tessel_test::InSandbox()) {
             GTEST_SKIP() << "changes owners under /volume1: run inside tests/sandbox/tessel-sandbox";
         }
-        scratch_ = std::make_unique<quor_test::ScratchDir>("/volume1");
+        scratch_ = std::make_unique<tessel_test::ScratchDir>("/volume1");
         ASSERT_TRUE(scratch_->ok());
         ASSERT_EQ(0, chmod(scratch_->path().c_str(), 0711));
         list_ = QLIBCSzListAlloc(4);
@@ -89,7 +90,7 @@ protected:
     }
 
     // Made in SetUp, once it is known that /volume1 is the sandbox's.
-    std::unique_ptr<quor_test::ScratchDir> scratch_;
+    std::unique_ptr<tessel_test::ScratchDir> scratch_;
     QLIBSZLIST *list_ = nullptr;
 };
 

@@ -12,13 +12,14 @@
 
 #include "quor/qlib.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 #include "platform/quor_test_files.h"
 
 namespace {
 
 using quor_test::PlatformErrorIs;
-using quor_test::ReadFile;
-using quor_test::WriteFile;
+using tessel_test::ReadFile;
+using tessel_test::WriteFile;
 
 class KeyValueFile : public ::testing::Test {
 protected:
@@ -26,7 +27,7 @@ protected:
         if (!tessel_test::InSandbox()) {
             GTEST_SKIP() << "writes under /tmp: run inside tests/sandbox/tessel-sandbox";
         }
-        scratch_ = std::make_unique<quor_test::ScratchDir>();
+        scratch_ = std::make_unique<tessel_test::ScratchDir>();
         ASSERT_TRUE(scratch_->ok());
         path_ = scratch_->file("settings");
         QLIBCErrClear();
@@ -44,7 +45,7 @@ protected:
     }
 
     // Made in SetUp, once it is known that /tmp is the sandbox's.
-    std::unique_ptr<quor_test::ScratchDir> scratch_;
+    std::unique_ptr<tessel_test::ScratchDir> scratch_;
     std::string path_;
 };
 

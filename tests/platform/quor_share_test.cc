@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <filesystem>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -10,6 +11,7 @@
 #include "platform/quor_test_files.h"
 #include "quor/quor.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
@@ -33,7 +35,7 @@ protected:
         std::error_code ec;
         std::filesystem::remove_all(QUOR_PLATFORM_CONF, ec);
     }
-    static void Write(const std::string &text) { ASSERT_TRUE(quor_test::WriteFile(QUOR_PLATFORM_CONF, text)); }
+    static void Write(const std::string &text) { ASSERT_TRUE(tessel_test::WriteFile(QUOR_PLATFORM_CONF, text)); }
 
     // The path of a share, or "<none>".
     static std::string SharePath(const char *name) {

@@ -3,13 +3,8 @@
 #define TESSEL_TESTS_PLATFORM_QUOR_TEST_FILES_H
 
 #include <dirent.h>
-#include <stdlib.h>
 #include <sys/stat.h>
 
-#include <algorithm>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <set>
 #include <string>
 
@@ -29,42 +24,6 @@ inline ::testing::AssertionResult PlatformErrorIs(int code, const std::string &f
     return ::testing::AssertionFailure() << "platform error 0x" << std::hex << QLIBCErrGet() << " at " << recorded
                                          << ":" << std::dec << QLIBCErrLineGet() << ", expected 0x" << std::hex
                                          << code << " from " << file;
-}
-
-// A fresh directory under base, removed with everything in it afterwards.
-class ScratchDir {
-public:
-    explicit ScratchDir(const std::string &base = "/tmp") {
-        std::string tmpl = base + "/quor-test-XXXXXX";
-        const char *dir = mkdtemp(&tmpl[0]);
-        path_ = (nullptr == dir) ? std::string() : std::string(dir);
-    }
-    ~ScratchDir() {
-        if (!path_.empty()) {
-            std::error_code ec;
-            std::filesystem::remove_all(path_, ec);
-        }
-    }
-    ScratchDir(const ScratchDir &) = delete;
-    ScratchDir &operator=(const ScratchDir &) = delete;
-
-    bool ok() const { return !path_.empty(); }
-    const std::string &path() const { return path_; }
-    std::string file(const std::string &name) const { return path_ + "/" + name; }
-
-private:
-    std::string path_;
-};
-
-inline bool WriteFile(const std::string &path, const std::string &content) {
-    std::ofstream out(path, std::ios::binary | std::ios::trunc);
-    out.write(content.data(), static_cast<std::streamsize>(content.size()));
-    return static_cast<bool>(out);
-}
-
-inline std::string ReadFile(const std::string &path) {
-    std::ifstream in(path, std::ios::binary);
-    return std::string((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
 }
 
 inline bool Exists(const std::string &path) {

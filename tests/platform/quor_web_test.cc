@@ -13,11 +13,12 @@
 #include "platform/quor_test_files.h"
 #include "quor/quor_web.h"
 #include "support/sandbox.h"
+#include "support/scratch.h"
 
 namespace {
 
-using quor_test::ReadFile;
-using quor_test::WriteFile;
+using tessel_test::ReadFile;
+using tessel_test::WriteFile;
 
 TEST(MimeType, ComesFromTheSystemTableByExtension) {
     HTTPFileOutputer outputer;
@@ -60,7 +61,7 @@ protected:
         if (!tessel_test::InSandbox()) {
             GTEST_SKIP() << "writes under /tmp: run inside tests/sandbox/tessel-sandbox";
         }
-        scratch_ = std::make_unique<quor_test::ScratchDir>();
+        scratch_ = std::make_unique<tessel_test::ScratchDir>();
         ASSERT_TRUE(scratch_->ok());
     }
 
@@ -86,7 +87,7 @@ protected:
         return ReadFile(out);
     }
 
-    std::unique_ptr<quor_test::ScratchDir> scratch_;
+    std::unique_ptr<tessel_test::ScratchDir> scratch_;
 };
 
 TEST_F(FileOutput, WritesHeadersThenTheExactBytes) {
