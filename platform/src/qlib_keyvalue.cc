@@ -12,6 +12,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <functional>
 #include <new>
 #include <string>
 
@@ -54,6 +55,18 @@ int ReadWholeFile(const char *szPath, std::string *pText, struct stat *pStat) {
 
 // Splits one line into key and value; false for blank, comment and other
 // lines that hold no pair.
+// Calls fn with each line of text, without its line break; a last line
+// without one counts too.
+void ForEachLine(const std::string &text, const std::function<void(const std::string &)> &fn) {
+    size_t pos = 0;
+    while (pos < text.size()) {
+        size_t nl = text.find('\n', pos);
+        size_t end = (std::string::npos == nl) ? text.size() : nl;
+        fn(text.substr(pos, end - pos));
+        pos = (std::string::npos == nl) ? text.size() : nl + 1;
+    }
+}
+
 bool ParseLine(const std::string &line, std::string *pKey, std::string *pValue) {
     size_t begin = line.find_first_not_of(" \t");
     if (std::string::npos == begin || '#' == line[begin]) {
@@ -101,17 +114,12 @@ KeyValueLookup KeyValueRead(const char *szPath, const std::string &key, std::str
     bool found = false;
     std::string lineKey;
     std::string lineValue;
-    size_t pos = 0;
-    while (pos < text.size()) {
-        size_t nl = text.find('\n', pos);
-        size_t next = (std::string::npos == nl) ? text.size() : nl + 1;
-        std::string line = text.substr(pos, next - pos - ((std::string::npos == nl) ? 0 : 1));
-        pos = next;
+    ForEachLine(text, [&](const std::string &line) {
         if (ParseLine(line, &lineKey, &lineValue) && lineKey == key) {
             pValue->swap(lineValue);
             found = true;
         }
-    }
+    });
     return found ? KeyValueLookup::kFound : KeyValueLookup::kMissing;
 }
 
@@ -207,22 +215,17 @@ int SetKeyValue(const char *szPath, const std::string &key, const std::string &v
     bool replaced = false;
     std::string lineKey;
     std::string lineValue;
-    size_t pos = 0;
-    while (pos < text.size()) {
-        size_t nl = text.find('\n', pos);
-        size_t next = (std::string::npos == nl) ? text.size() : nl + 1;
-        std::string line = text.substr(pos, next - pos - ((std::string::npos == nl) ? 0 : 1));
-        pos = next;
+    quor_internal::ForEachLine(text, [&](const std::string &line) {
         if (quor_internal::ParseLine(line, &lineKey, &lineValue) && lineKey == key) {
             if (!replaced) {
                 out += newLine;
                 replaced = true;
             }
-            continue;
+            return;
         }
         out += line;
         out += '\n';
-    }
+    });
     if (!replaced) {
         out += newLine;
     }
