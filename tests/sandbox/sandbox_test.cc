@@ -1,4 +1,5 @@
 // The sandbox itself: the guarantees every other test program relies on.
+#include <fcntl.h>
 #include <grp.h>
 #include <pwd.h>
 #include <sys/stat.h>
@@ -94,3 +95,23 @@ TEST(Sandbox, PrivatePostgresWithoutTheTesselDatabase) {
 }
 
 }  // namespace
+
+TEST(Sandbox, RunAsUserKeepsRootInReserve) {
+    using namespace tessel_test;
+    int rc = RunAsUser(kUidAlice, kGidUsers, []() {
+        uid_t ruid, euid, suid;
+        gid_t rgid, egid, sgid;
+        getresuid(&ruid, &euid, &suid);
+        getresgid(&rgid, &egid, &sgid);
+        EXPECT_EQ(kUidAlice, euid);
+        EXPECT_EQ(kGidUsers, egid);
+        EXPECT_EQ(0u, ruid);
+        EXPECT_EQ(0u, suid);
+        // The shadow file is root's: the caller itself cannot open it
+        // (access() would ask for the real uid, which is still root).
+        EXPECT_NE(0, faccessat(AT_FDCWD, "/etc/shadow", R_OK, AT_EACCESS));
+        EXPECT_EQ(0, seteuid(0)) << "the saved uid lets the library raise itself";
+        return ::testing::Test::HasFailure() ? 1 : 0;
+    });
+    EXPECT_EQ(0, rc);
+}

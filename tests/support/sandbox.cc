@@ -139,4 +139,15 @@ int RunInChild(const std::function<int()> &fn) {
     return WEXITSTATUS(status);
 }
 
+int RunAsUser(unsigned uid, unsigned gid, const std::function<int()> &fn) {
+    return RunInChild([&]() {
+        // Group first: once the effective uid is a user's, the gid can no
+        // longer be changed to an arbitrary one.
+        if (0 != setresgid(-1, static_cast<gid_t>(gid), -1) || 0 != setresuid(-1, static_cast<uid_t>(uid), -1)) {
+            return 125;
+        }
+        return fn();
+    });
+}
+
 }  // namespace tessel_test

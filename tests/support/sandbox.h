@@ -70,6 +70,16 @@ std::optional<std::string> PgValue(PGconn *conn, const std::string &sql);
  */
 int RunInChild(const std::function<int()> &fn);
 
+/*
+ * Runs fn in a forked child that calls as a user the way an application
+ * that dropped its privileges does: effective gid and uid are the given
+ * ones, real and saved ids stay root (so the library can raise itself).
+ * Returns fn's result; 125 when the switch failed; -1 on a signal. GoogleTest
+ * failures in the child do not reach the parent: return
+ * ::testing::Test::HasFailure() ? 1 : 0 from fn.
+ */
+int RunAsUser(unsigned uid, unsigned gid, const std::function<int()> &fn);
+
 }  // namespace tessel_test
 
 #endif /* TESSEL_TESTS_SUPPORT_SANDBOX_H */
