@@ -2,6 +2,7 @@
 #include "backend_pgsql/tessel_backend_pgsql.h"
 
 #include "common/tessel_report.h"
+#include "tessel_index.h"
 
 static constexpr const char kTesselModule[] = "backend_pgsql/tessel_backend_pgsql";
 
@@ -11,10 +12,9 @@ namespace {
 const RegisterBackend g_registerPgsql("pgsql", CreatePgsqlBackend);
 }  // namespace
 
-// The process-wide connection is attached here, from TesselOpenConn(), once
-// the index database module provides it. A backend whose connection cannot be
-// opened is still made, with a null handle, so the handle starts out null.
-TESSEL_BACKEND_PGSQL::TESSEL_BACKEND_PGSQL() : m_conn(NULL) {}
+// A backend whose connection cannot be opened is still made, with a null
+// handle; the failure stays on the error stack.
+TESSEL_BACKEND_PGSQL::TESSEL_BACKEND_PGSQL() : m_conn(TesselOpenConn()) {}
 
 // The connection belongs to the process, not to the backend.
 TESSEL_BACKEND_PGSQL::~TESSEL_BACKEND_PGSQL() {}
