@@ -150,8 +150,8 @@ DBConnect_tag *TesselOpenConn() {
     TESSEL_CHECK(FALSE == QLIBServiceIsRunning(SZ_PGSQL_SERVICE_NAME), TESSEL_ERR_PGSQL_DISABLED,
                  "FALSE == QLIBServiceIsRunning(SZ_PGSQL_SERVICE_NAME)", NULL);
     {
-        // Root for the connection: the server trusts local connections by
-        // account, and createdb runs as the postgres account through su.
+        // Root for both: the server admits the postgres role to root's local
+        // connections, and su starts createdb as postgres only for root.
         TESSEL_AS_ROOT();
         gpConn = QUORDBConnect(NULL, SZ_DB_ROLE, NULL, SZ_DB_NAME);
         if (NULL == gpConn) {
@@ -186,10 +186,12 @@ void TesselCloseGlobalConn() {
 // by an older release may have only the object table.
 bool TesselCreateObjectTable(DBConnect_tag *pConn) {
     TESSEL_CHECK(!pConn, TESSEL_ERR_BAD_PARAMETERS, "!pConn", false);
-    return EnsureTable(pConn, SZ_SQL_CHECK_OBJECT_TABLE, "-1 == QUORDBExecute(pConn, SZ_SQL_CHECK_OBJECT_TABLE, &pResult)",
-                       SZ_SQL_CREATE_TABLE, "-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_TABLE, NULL)") &&
-           EnsureTable(pConn, SZ_SQL_CHECK_PERSON_TABLE, "-1 == QUORDBExecute(pConn, SZ_SQL_CHECK_PERSON_TABLE, &pResult)",
-                       SZ_SQL_CREATE_PERSON_TABLE, "-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_PERSON_TABLE, NULL)");
+    return EnsureTable(pConn, SZ_SQL_CHECK_OBJECT_TABLE,
+                       "-1 == QUORDBExecute(pConn, SZ_SQL_CHECK_OBJECT_TABLE, &pResult)", SZ_SQL_CREATE_TABLE,
+                       "-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_TABLE, NULL)") &&
+           EnsureTable(pConn, SZ_SQL_CHECK_PERSON_TABLE,
+                       "-1 == QUORDBExecute(pConn, SZ_SQL_CHECK_PERSON_TABLE, &pResult)", SZ_SQL_CREATE_PERSON_TABLE,
+                       "-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_PERSON_TABLE, NULL)");
 }
 
 // Callers (the settings writer, when a namespace is switched on) hold no
