@@ -155,6 +155,11 @@ TEST(BackendDefaults, OtherStoresOperationsAnswerSilently) {
     ASSERT_NE(nullptr, pgsql);
     const Json::Value jParmBefore = jParm;
 
+    // Making the pgsql store opens the index connection, which logs its
+    // failure in this sandbox without a server; let those lines arrive first.
+    const std::string flushed = "backends made " + std::to_string(getpid());
+    syslog(LOG_INFO, "%s", flushed.c_str());
+    ASSERT_TRUE(tessel_test::WaitForSyslog(flushed, 0).has_value());
     size_t mark = tessel_test::SyslogMark();
     for (const StubCase &c : cases) {
         SCOPED_TRACE(std::string(c.backend) + "::" + c.op);
