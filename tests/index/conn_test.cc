@@ -7,12 +7,14 @@
 #include <unistd.h>
 
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 #include <libpq-fe.h>
 
 #include "index/index_test_util.h"
 #include "quor/qlib.h"
+#include "support/error_stack.h"
 #include "support/process_holding.h"
 #include "support/sandbox.h"
 
@@ -20,11 +22,9 @@ namespace {
 
 using index_test::CountOneClosing;
 using index_test::kCounter;
-using index_test::Stack;
 using namespace tessel_test;
 
-const std::string kConnectFailed =
-    "1025 index/tessel_index [NULL == (gpConn = QUORDBConnect(NULL, \"postgres\", NULL, \"tessel\"))]";
+const std::string kConnectFailed = "NULL == (gpConn = QUORDBConnect(NULL, \"postgres\", NULL, \"tessel\"))";
 
 // The rows of a query on a direct connection, "a|b" per row, joined by "\n";
 // "<error>" when it fails. Statements without rows give "".
@@ -160,7 +160,8 @@ TEST_F(IndexConnTest, UserCallerOpensAsRootAndGetsItsIdsBackAlsoOnFailure) {
     ASSERT_EQ(0, RunAsUser(kUidAlice, kGidUsers, [] {
         for (int i = 0; i < 2; ++i) {
             EXPECT_EQ(nullptr, TesselOpenConn());
-            EXPECT_EQ(kConnectFailed, Stack());
+            EXPECT_EQ(1025, ErrCode());
+            EXPECT_EQ(std::vector<std::string>{kConnectFailed}, ErrMsgs());
             EXPECT_EQ(kUidAlice, geteuid());
             EXPECT_EQ(kGidUsers, getegid());
         }
@@ -177,9 +178,10 @@ TEST_F(IndexConnTest, FailedTableCreationKeepsNoConnectionAndTablesComeBack) {
     ASSERT_EQ("", Sql("CREATE TABLE blocker(id text);CREATE INDEX id_idx ON blocker (id)"));
     ASSERT_EQ(0, RunInChild([] {
         EXPECT_EQ(nullptr, TesselOpenConn());
-        EXPECT_EQ("1025 index/tessel_index [-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_TABLE, NULL)] < "
-                  "index/tessel_index [!TesselCreateObjectTable(gpConn)]",
-                  Stack());
+        EXPECT_EQ(1025, ErrCode());
+        EXPECT_EQ((std::vector<std::string>{"-1 == QUORDBExecute(pConn, SZ_SQL_CREATE_TABLE, NULL)",
+                                            "!TesselCreateObjectTable(gpConn)"}),
+                  ErrMsgs());
         EXPECT_EQ("", Sql("DROP INDEX id_idx"));
         // The failed session sits in an aborted transaction: kept, it would fail here.
         const long pid = BackendPid(TesselOpenConn());

@@ -1,5 +1,5 @@
-// What both index test programs read back: the error stack, and the vacuum
-// counter after one closing has been counted.
+// The vacuum counter file as both index test programs read it back after
+// one closing has been counted.
 #ifndef TESSEL_TESTS_INDEX_INDEX_TEST_UTIL_H
 #define TESSEL_TESTS_INDEX_INDEX_TEST_UTIL_H
 
@@ -10,24 +10,12 @@
 #include <gtest/gtest.h>
 
 #include "support/scratch.h"
-#include "tessel_error.h"
 #include "tessel_index.h"
 
 namespace index_test {
 
 constexpr char kCounter[] = "/tmp/tessel.tmp";
 constexpr char kCounterLock[] = "/tmp/tessel.tmp.lock";
-
-// The calling thread's stack as "code file [msg] < file [msg] ...".
-inline std::string Stack() {
-    std::string text;
-    for (const Json::Value &jFrame : TesselErrMsgGet()) {
-        text += text.empty() ? "" : " < ";
-        text += jFrame.isMember("code") ? std::to_string(jFrame["code"].asInt()) + " " : "";
-        text += jFrame["file"].asString() + " [" + jFrame["msg"].asString() + "]";
-    }
-    return text;
-}
 
 // Runs the vacuum check, waits for its child and returns the counter file.
 inline std::string CountOneClosing() {
