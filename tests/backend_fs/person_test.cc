@@ -1,6 +1,7 @@
 // Person records of an object: what a selection reads, how writes merge or
 // replace, and loading one person into a record.
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <string>
@@ -73,7 +74,7 @@ TEST(PersonRecords, AFailedRecordIsLoggedAndTheOthersStillWritten) {
     size_t mark = SyslogMark();
     // A record that is not an object cannot be merged.
     EXPECT_FALSE(tessel::SavePersons(strDir, Parse(R"({"1001": [1, 2], "1002": {"role": "reader"}})")));
-    EXPECT_TRUE(WaitForSyslog("failed to mergeJsonObject[1001][[1,2]]", mark, LOG_ERR).has_value());
+    EXPECT_TRUE(WaitForSyslog("failed to mergeJsonObject[1001][[1,2]]", mark, LOG_USER | LOG_ERR).has_value());
     EXPECT_NE(0, access(PersonFile(strDir, "1001").c_str(), F_OK));
     EXPECT_EQ(Parse(R"({"role": "reader"})"), ReadJson(PersonFile(strDir, "1002")));
 
@@ -81,7 +82,7 @@ TEST(PersonRecords, AFailedRecordIsLoggedAndTheOthersStillWritten) {
     mark = SyslogMark();
     EXPECT_FALSE(tessel::SavePersons(strDir + "/missing", Parse(R"({"1003": {"a": 1}})")));
     EXPECT_TRUE(WaitForSyslog("failed to write [1003] from [" + PersonFile(strDir + "/missing", "1003") + "]", mark,
-                              LOG_ERR)
+                              LOG_USER | LOG_ERR)
                     .has_value());
 }
 
@@ -115,7 +116,7 @@ TEST(PersonRecords, TheSelectionDecidesWhatIsRead) {
     jPerson = Json::Value(Json::objectValue);
     ASSERT_TRUE(tessel::ReadPersons(strDir, Parse(R"(["1001", "1009"])"), jPerson));
     EXPECT_EQ(Parse(R"({"1001": {"r": 1}})"), jPerson);
-    EXPECT_TRUE(WaitForSyslog("failed to read [1009] from [" + PersonFile(strDir, "1009") + "]", mark, LOG_ERR)
+    EXPECT_TRUE(WaitForSyslog("failed to read [1009] from [" + PersonFile(strDir, "1009") + "]", mark, LOG_USER | LOG_ERR)
                     .has_value());
 }
 

@@ -35,7 +35,7 @@ TEST(ObjectId, GeneratedIdsAreOwnerAndNinetySixHexDigits) {
     EXPECT_NE(strId.substr(37, 32), strId.substr(69, 32));
     EXPECT_EQ(1026u, TesselObjectGetOwnerByID(strId));
     EXPECT_EQ(1026, TesselExtractUid(strId.c_str()));
-    EXPECT_EQ(2u + 97u, TesselObjectGenerateID(0, "").size());
+    EXPECT_EQ(1u + 97u, TesselObjectGenerateID(0, "").size());
 }
 
 TEST(ObjectId, GeneratedIdsDifferAcrossCallsAndThreads) {
