@@ -2,7 +2,7 @@
 // switches, per-user sharing switches, index filters, the owner-validity and
 // index-filter caches, and the application privilege of a namespace.
 //
-// The file is root's (it may be mode 0600), so every access to it happens in
+// The file is root's (it may be mode 0600), so it is read and written only in
 // a privilege-raising section; callers running as a user reach it that way.
 #include <stdio.h>
 #include <sys/file.h>
@@ -193,8 +193,8 @@ BOOL TesselSettingsAccessGetEx(const Json::Value &jConf, const char *szNameSpace
     if (NULL == szNameSpace) {
         TESSEL_CHECK(!jAccess.isMember("enable"), TESSEL_ERR_DISABLED, "!jConf[\"Access\"].isMember(\"enable\")",
                      FALSE);
-        TESSEL_CHECK(!jAccess["enable"].isBool(), TESSEL_ERR_CONF_CORRUPTED,
-                     "!jConf[\"Access\"][\"enable\"].isBool()", FALSE);
+        TESSEL_CHECK(!jAccess["enable"].isBool(), TESSEL_ERR_CONF_CORRUPTED, "!jConf[\"Access\"][\"enable\"].isBool()",
+                     FALSE);
         TESSEL_CHECK(!jAccess["enable"].asBool(), TESSEL_ERR_DISABLED, "!jConf[\"Access\"][\"enable\"].asBool()",
                      FALSE);
         return TRUE;
@@ -222,8 +222,8 @@ BOOL TesselAccessCheck(const char *szNameSpace) {
     if (!ReadExistingConf(jConf)) {
         return FALSE;
     }
-    TESSEL_CHECK_APPEND(FALSE == TesselSettingsAccessGetEx(jConf, NULL), "FALSE == TesselSettingsAccessGetEx(jConf, NULL)",
-                        FALSE);
+    TESSEL_CHECK_APPEND(FALSE == TesselSettingsAccessGetEx(jConf, NULL),
+                        "FALSE == TesselSettingsAccessGetEx(jConf, NULL)", FALSE);
     if (NULL != szNameSpace) {
         TESSEL_CHECK_APPEND(FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace),
                             "FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace)", FALSE);
