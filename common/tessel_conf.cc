@@ -16,6 +16,7 @@
 #include <quor/quor.h>
 
 #include "common/tessel_json.h"
+#include "common/tessel_ns_hook.h"
 #include "common/tessel_pathname.h"
 #include "common/tessel_priv.h"
 #include "common/tessel_report.h"
@@ -31,8 +32,6 @@ namespace {
 
 constexpr const char SZF_TESSEL_CONF_PATH[] = "/usr/quor/etc/tessel.conf";
 constexpr const char SZF_TESSEL_CONF_LOCK[] = "/tmp/.tessel_conf.lock";
-// Namespace module descriptors: "<dir>/<ns>.lib", the doubled slash included.
-constexpr const char SZD_TESSEL_NS_MODULE[] = "/usr/local/libexec/tessel/";
 constexpr long long kConfLockTimeoutUs = 5000000;
 // Keys made from a namespace name or a uid; a longer name is cut here.
 constexpr size_t kKeySize = 4096;
@@ -459,7 +458,7 @@ BOOL TesselObjectIDIsValid(const char *szID) {
 std::string TesselAppPrivName(const std::string &strNs) {
     TESSEL_CHECK(!tessel::TesselIsPathComponent(strNs), TESSEL_ERR_USER_INPUT, "!TesselIsPathComponent(strNs)",
                  std::string());
-    const std::string strPath = std::string(SZD_TESSEL_NS_MODULE) + "/" + strNs + ".lib";
+    const std::string strPath = tessel::NsModuleDescriptorPath(strNs);
     Json::Value jsDesc;
     if (!ReadModuleDescriptor(strPath, jsDesc)) {
         return std::string();

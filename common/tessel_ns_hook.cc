@@ -6,6 +6,7 @@
 #include <json/value.h>
 
 #include "common/tessel_json.h"
+#include "common/tessel_ns_hook.h"
 #include "common/tessel_pathname.h"
 #include "common/tessel_priv.h"
 #include "common/tessel_report.h"
@@ -22,10 +23,14 @@ constexpr const char SZ_TESSEL_NS_MODULE_SUFFIX[] = ".lib";
 
 }  // namespace
 
+std::string tessel::NsModuleDescriptorPath(const std::string &strNs) {
+    return std::string(SZD_TESSEL_NS_MODULE) + "/" + strNs + SZ_TESSEL_NS_MODULE_SUFFIX;
+}
+
 std::string TesselNsHookPath(const std::string &strNs) {
     TESSEL_CHECK(!tessel::TesselIsPathComponent(strNs), TESSEL_ERR_USER_INPUT, "!TesselIsPathComponent(strNs)",
                  std::string());
-    const std::string strPath = std::string(SZD_TESSEL_NS_MODULE) + "/" + strNs + SZ_TESSEL_NS_MODULE_SUFFIX;
+    const std::string strPath = tessel::NsModuleDescriptorPath(strNs);
     // No descriptor is the common case (a namespace without hooks), not an error.
     if (0 != access(strPath.c_str(), R_OK)) {
         return std::string();
