@@ -20,7 +20,15 @@ TESSEL_EXPORT BOOL TesselSupportVolumeMove(void);
 TESSEL_EXPORT BOOL TesselGetRepoDir(std::string &strRepo);
 TESSEL_EXPORT BOOL TesselGetNSPath(const std::string &strNS, std::string &strNSPath);
 TESSEL_EXPORT BOOL TesselFindNSPath(const std::string &strNS, const std::string &strPkgId, std::string &strNSPath);
+/*
+ * Places the namespace (an existing link that resolves to a directory is kept
+ * as it is), links it, and creates its directory and scratch directory. The
+ * link directory is created (root only) when missing; a link that resolves to
+ * no directory is replaced.
+ */
 TESSEL_EXPORT BOOL TesselSetNSPath(const std::string &strNS, const std::string &strPkgId, std::string &strNSPath);
+/* Re-points the namespace's link after a move; this process forgets its cached
+ * path and uses the new one from then on (other processes keep theirs). */
 TESSEL_EXPORT BOOL TesselResetNSPath(const std::string &strNS, const std::string &strNSPath);
 TESSEL_EXPORT BOOL TesselGetNSStatus(const std::string &strNS);
 TESSEL_EXPORT BOOL TesselGetNSVolumePath(const std::string &strNS, std::string &strVolPath);
