@@ -31,6 +31,12 @@ enum {
     TESSEL_LOCK_ALL = 14
 };
 
+/*
+ * An advisory record lock over a whole lock file, created (mode 0644) as root
+ * when missing. Closing the descriptor (Close, destruction) drops the lock, as
+ * does closing any other descriptor of the same file in this process: never
+ * keep two of these on one file where one may go before the other.
+ */
 class TESSEL_EXPORT TESSEL_FILE_LOCK {
 public:
     explicit TESSEL_FILE_LOCK(const std::string &strFileName);
@@ -62,7 +68,9 @@ protected:
     TESSEL_FILE_LOCK *m_pFileLock;
 };
 
-/* "<namespace scratch directory>/<id>.lock". */
+/* "<namespace scratch directory>/<id>.lock". Without that directory, or for an
+ * id that is not a single path component, there is no lock file and every lock
+ * fails; likewise below for a namespace that is not one. */
 class TESSEL_EXPORT TESSEL_LOCKER_BACKUP_OBJECT : public TESSEL_LOCKER_BASIC {
 public:
     TESSEL_LOCKER_BACKUP_OBJECT(const std::string &strNs, const std::string &strId);
