@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -43,6 +44,16 @@ void ExpectStack(int code, const Msgs &msgs) {
     EXPECT_EQ(code, ErrCode());
     EXPECT_EQ(msgs, ErrMsgs());
     ErrClear();
+}
+
+// Runs fn in a fresh child (as a user when uid is given); the child's
+// GoogleTest failures come back as its status.
+void ExpectInChild(const std::function<void()> &fn, unsigned uid = 0, unsigned gid = 0) {
+    auto checked = [&fn] {
+        fn();
+        return ::testing::Test::HasFailure() ? 1 : 0;
+    };
+    EXPECT_EQ(0, 0 == uid ? RunInChild(checked) : RunAsUser(uid, gid, checked)) << "see the child's failures above";
 }
 
 void Put(const char *text) {  // nullptr: no file
@@ -210,25 +221,27 @@ TEST_F(Conf, UserCallerReachesRootOnlyFilesAndKeepsItsIds) {
     ASSERT_TRUE(WriteFile(kDesc, R"({"lib":"/x.so","app priv":"LEDGER_PRIV"})"));
     ASSERT_EQ(0, chmod(kDesc, 0600));
     ASSERT_EQ(0, chmod(kConf, 0600));
-    EXPECT_EQ(
-        0, RunAsUser(kUidAlice, kGidUsers, [] {
-            EXPECT_EQ(-1, open(kConf, O_RDONLY));  // not on its own
-            auto asAlice = [](bool answer) { return answer && kUidAlice == geteuid() && kGidUsers == getegid(); };
-            Json::Value jOut;
-            EXPECT_TRUE(asAlice(TesselAccessCheck("ledger")));
-            EXPECT_TRUE(asAlice(!TesselAccessCheck("notes")));
-            EXPECT_TRUE(asAlice(0 == TesselSettingsAccessSet("notes", "NotesApp", 1)));
-            EXPECT_TRUE(asAlice(0 == TesselSettingsSharingSet("notes", kUidAlice, 0)));
-            EXPECT_TRUE(asAlice(TesselSettingsIndexSet("notes", J(R"({"text":{}})"))));
-            EXPECT_TRUE(asAlice(!TesselSettingsIndexSet("notes", J("{}"))));
-            EXPECT_TRUE(asAlice(!TesselSharingCheck("notes", kUidAlice)));
-            EXPECT_TRUE(asAlice(TesselSettingsGet("notes", jOut) && TesselSettingsIndexGet("notes", jOut)));
-            EXPECT_EQ(J(R"({"text":{}})"), jOut);
-            EXPECT_TRUE(asAlice("LEDGER_PRIV" == TesselAppPrivName("ledger") && TesselAppPrivName("absent").empty()));
-            EXPECT_TRUE(asAlice(TesselAppPrivName("..").empty()));
-            ExpectStack(1007, {"!TesselIsPathComponent(strNs)"});
-            return ::testing::Test::HasFailure() ? 1 : 0;
-        }));
+    ExpectInChild([] {
+        EXPECT_EQ(-1, open(kConf, O_RDONLY));  // not on its own
+        auto as = [](bool answer) {  // each call hands back the caller's ids
+            EXPECT_EQ(kUidAlice, geteuid());
+            EXPECT_EQ(kGidUsers, getegid());
+            return answer;
+        };
+        Json::Value jOut;
+        EXPECT_TRUE(as(TesselAccessCheck("ledger")));
+        EXPECT_TRUE(as(!TesselAccessCheck("notes")));
+        EXPECT_TRUE(as(0 == TesselSettingsAccessSet("notes", "NotesApp", 1)));
+        EXPECT_TRUE(as(0 == TesselSettingsSharingSet("notes", kUidAlice, 0)));
+        EXPECT_TRUE(as(TesselSettingsIndexSet("notes", J(R"({"text":{}})"))));
+        EXPECT_TRUE(as(!TesselSettingsIndexSet("notes", J("{}"))));
+        EXPECT_TRUE(as(!TesselSharingCheck("notes", kUidAlice)));
+        EXPECT_TRUE(as(TesselSettingsGet("notes", jOut) && TesselSettingsIndexGet("notes", jOut)));
+        EXPECT_EQ(J(R"({"text":{}})"), jOut);
+        EXPECT_TRUE(as("LEDGER_PRIV" == TesselAppPrivName("ledger") && TesselAppPrivName("absent").empty()));
+        EXPECT_TRUE(as(TesselAppPrivName("..").empty()));
+        ExpectStack(1007, {"!TesselIsPathComponent(strNs)"});
+    }, kUidAlice, kGidUsers);
     EXPECT_EQ(R"({"Access":{"enable":true,"enable_ns_ledger":true,"enable_ns_notes":true},"Index":{"notes":)"
               R"({"text":{}}},"Sharing":{"1001":{"disable_ns_notes":true}},"pkg_id":{"notes":"NotesApp"}})",
               ReadFile(kConf));
@@ -295,53 +308,54 @@ protected:
         ASSERT_NE(std::string::npos, at) << from;
         ASSERT_TRUE(WriteFile(path, text.replace(at, from.size(), to)));
     }
+    void Scenario();
     std::string shadow_, passwd_;
 };
 
 TEST_F(ConfCache, FiltersAndOwnerVerdictsOutliveChanges) {
     Put(R"({"Index":{"ledger":{"text":{"old":true}}}})");
-    EXPECT_EQ(0, RunInChild([] {
-                  Json::Value jOut;
-                  EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
-                  EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));  // an empty filter is kept too
-                  EXPECT_TRUE(TesselSettingsIndexSet("ledger", J(R"({"text":{"new":true}})")));
-                  EXPECT_TRUE(TesselSettingsIndexSet("notes", J(R"({"text":{"new":true}})")));
-                  EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
-                  EXPECT_EQ(J(R"({"text":{"old":true}})"), jOut);
-                  EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));
-                  EXPECT_EQ(Json::Value(Json::objectValue), jOut);
-                  ErrClear();
-                  EXPECT_FALSE(TesselSettingsIndexGetFromCache("", jOut));
-                  ExpectStack(-1, {"strNs.empty()", "!TesselSettingsIndexGet(strNs, jsFilter)"});
+    ExpectInChild([this] { Scenario(); });
+    ExpectInChild([] {  // while a fresh process sees the expiry
+        EXPECT_FALSE(TesselObjectOwnerIsValid(kUidAlice));
+        ExpectStack(1030, {"jsInfo[\"expire\"].asBool()"});
+    });
+}
 
-                  EXPECT_FALSE(TesselObjectOwnerIsValid(UID_ROOT));
-                  ExpectStack(1007, {"UID_ROOT == owner || UID_ERR == owner"});
-                  EXPECT_FALSE(TesselObjectOwnerIsValid(kUidCarol));
-                  ExpectStack(1030, {"jsInfo[\"expire\"].asBool()"});
-                  EXPECT_FALSE(TesselObjectOwnerIsValid(kUidUnknown));
-                  ExpectStack(1022, {"!TesselGetUserInfo(owner, jsInfo, true)"});
-                  EXPECT_TRUE(TesselObjectOwnerIsValid(kUidAlice));
-                  Replace("/etc/shadow", "alice:!:19000:0:99999:7:::", "alice:!:19000:0:99999:7::1:");
-                  EXPECT_EQ(0, RunInChild([] {  // a fresh process sees the expiry
-                                EXPECT_FALSE(TesselObjectOwnerIsValid(kUidAlice));
-                                ExpectStack(1030, {"jsInfo[\"expire\"].asBool()"});
-                                return ::testing::Test::HasFailure() ? 1 : 0;
-                            }));
-                  EXPECT_TRUE(TesselObjectOwnerIsValid(kUidAlice));
-                  TesselErrSetEx(1000, "marker", 1, "marker");
-                  EXPECT_FALSE(TesselObjectOwnerIsValid(kUidCarol));  // a remembered refusal reports nothing
-                  ExpectStack(1000, {"marker"});
+void ConfCache::Scenario() {
+    Json::Value jOut;
+    EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
+    EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));  // an empty filter is kept too
+    EXPECT_TRUE(TesselSettingsIndexSet("ledger", J(R"({"text":{"new":true}})")));
+    EXPECT_TRUE(TesselSettingsIndexSet("notes", J(R"({"text":{"new":true}})")));
+    EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
+    EXPECT_EQ(J(R"({"text":{"old":true}})"), jOut);
+    EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));
+    EXPECT_EQ(Json::Value(Json::objectValue), jOut);
+    ErrClear();
+    EXPECT_FALSE(TesselSettingsIndexGetFromCache("", jOut));
+    ExpectStack(-1, {"strNs.empty()", "!TesselSettingsIndexGet(strNs, jsFilter)"});
 
-                  EXPECT_FALSE(TesselObjectIDIsValid(nullptr));
-                  ExpectStack(1015, {"NULL == szID"});
-                  EXPECT_TRUE(TesselObjectIDIsValid("1001_#00000000"));
-                  EXPECT_FALSE(TesselObjectIDIsValid("1003_#00000000"));
-                  ExpectStack(-1, {"FALSE == TesselObjectOwnerIsValid(owner)"});
-                  EXPECT_FALSE(TesselObjectIDIsValid("x1_#00000000"));
-                  EXPECT_EQ(1007, ErrCode());
-                  EXPECT_EQ("UID_ERR == (owner = TesselObjectGetOwnerByID(szID))", ErrMsgs().back());
-                  return ::testing::Test::HasFailure() ? 1 : 0;
-              }));
+    EXPECT_FALSE(TesselObjectOwnerIsValid(UID_ROOT));
+    ExpectStack(1007, {"UID_ROOT == owner || UID_ERR == owner"});
+    EXPECT_FALSE(TesselObjectOwnerIsValid(kUidCarol));
+    ExpectStack(1030, {"jsInfo[\"expire\"].asBool()"});
+    EXPECT_FALSE(TesselObjectOwnerIsValid(kUidUnknown));
+    ExpectStack(1022, {"!TesselGetUserInfo(owner, jsInfo, true)"});
+    EXPECT_TRUE(TesselObjectOwnerIsValid(kUidAlice));
+    Replace("/etc/shadow", "alice:!:19000:0:99999:7:::", "alice:!:19000:0:99999:7::1:");
+    EXPECT_TRUE(TesselObjectOwnerIsValid(kUidAlice));
+    TesselErrSetEx(1000, "marker", 1, "marker");
+    EXPECT_FALSE(TesselObjectOwnerIsValid(kUidCarol));  // a remembered refusal reports nothing
+    ExpectStack(1000, {"marker"});
+
+    EXPECT_FALSE(TesselObjectIDIsValid(nullptr));
+    ExpectStack(1015, {"NULL == szID"});
+    EXPECT_TRUE(TesselObjectIDIsValid("1001_#00000000"));
+    EXPECT_FALSE(TesselObjectIDIsValid("1003_#00000000"));
+    ExpectStack(-1, {"FALSE == TesselObjectOwnerIsValid(owner)"});
+    EXPECT_FALSE(TesselObjectIDIsValid("x1_#00000000"));
+    EXPECT_EQ(1007, ErrCode());
+    EXPECT_EQ("UID_ERR == (owner = TesselObjectGetOwnerByID(szID))", ErrMsgs().back());
 }
 
 TEST_F(ConfCache, UserHomeSwitchFollowsTheFormOfTheName) {
@@ -356,12 +370,11 @@ TEST_F(ConfCache, UserHomeSwitchFollowsTheFormOfTheName) {
     for (const Case &c : cases) {
         SCOPED_TRACE(c.conf);
         ASSERT_TRUE(WriteFile("/usr/quor/etc/platform.conf", c.conf));
-        EXPECT_EQ(0, RunInChild([&c] {
-                      EXPECT_FALSE(TesselObjectOwnerIsValid(c.refused));
-                      ExpectStack(1011, {"FALSE == QUORServiceUserHomeIsEnabled(authType, NULL)"});
-                      EXPECT_TRUE(TesselObjectOwnerIsValid(c.accepted));
-                      return ::testing::Test::HasFailure() ? 1 : 0;
-                  }));
+        ExpectInChild([&c] {
+            EXPECT_FALSE(TesselObjectOwnerIsValid(c.refused));
+            ExpectStack(1011, {"FALSE == QUORServiceUserHomeIsEnabled(authType, NULL)"});
+            EXPECT_TRUE(TesselObjectOwnerIsValid(c.accepted));
+        });
     }
 }
 
