@@ -12,6 +12,7 @@
 #define TESSEL_BACKEND_FS_TESSELBACKEND_FS_H
 
 #include <string>
+#include <vector>
 
 #include <json/value.h>
 
@@ -39,6 +40,41 @@ public:
     int List(const Json::Value &jParm, TESSEL_OBJECT **addrPHead, unsigned int &total) override;
     bool ListChildren(const Json::Value &jParm, Json::Value &jsIds) override;
     bool HasChildren(const Json::Value &jParm) override;
+
+private:
+    bool mf_init(const Json::Value &jParm, bool bCreate = false, TESSEL_OBJECT *pObject = NULL);
+    bool mf_GetPathInfo(const Json::Value &jParm, Json::Value &jPathInfo, TESSEL_OBJECT *pObject);
+    bool mf_GetPathInfoByBase(const std::string &strBase, Json::Value &jPathInfo);
+    bool mf_GetPathInfoByGitBase(const std::string &strBase, Json::Value &jPathInfo);
+    bool mf_CreatePath();
+
+    /* Whether a read touches / a write changes the storage place szType. */
+    bool mf_NeedToGet(const char *szType);
+    bool mf_NeedToGetCheckOne(const Json::Value &jValue);
+    bool mf_NeedToSave(const char *szType);
+
+    bool mf_GetConfigFieldFromJson(const char *szType, Json::Value &jOut);
+    bool mf_GetJsonFile(const char *szType, Json::Value &jOut);
+    bool mf_SetJsonFile(const char *szType);
+    bool mf_MergeAndCheckMtime(const char *szType, Json::Value &jOld, const Json::Value &jNew);
+    bool mf_SaveConfig(std::string &strNewVer);
+
+    bool mf_GetBasic(TESSEL_OBJECT *pObject);
+    bool mf_SaveBasic();
+    bool mf_GetMetaText(TESSEL_OBJECT *pObject);
+    bool mf_SaveMetaText();
+    bool mf_GetMetaBinaryInfo(TESSEL_OBJECT *pObject, bool blForce);
+    bool mf_SaveMetaBinary();
+    bool mf_GetGit(TESSEL_OBJECT *pObject);
+    bool mf_SaveGit(std::string &strNewVer);
+    bool mf_GetPerson(TESSEL_OBJECT *pObject);
+    bool mf_SavePerson();
+
+    Json::Value m_jParm;
+    Json::Value m_jPathInfo;
+    Json::Value m_jFieldTable;
+    /* The table's field names in their stored order. */
+    std::vector<std::string> m_fieldOrder;
 };
 
 #endif /* TESSEL_BACKEND_FS_TESSELBACKEND_FS_H */
