@@ -14,6 +14,7 @@
 #include <gtest/gtest.h>
 
 #include "common/tessel_json.h"
+#include "support/json_text.h"
 #include "support/error_stack.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
@@ -30,17 +31,7 @@ const std::string kRepo = "/volume1/@Tessel";
 const std::string kNsDir = kRepo + "/ledger";
 using Msgs = std::vector<std::string>;
 
-Json::Value Parse(const std::string &strText) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromString(jVal, strText)) << strText;
-    return jVal;
-}
 
-Json::Value ReadJson(const std::string &strPath) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromFile(jVal, strPath)) << strPath;
-    return jVal;
-}
 
 class FsStore : public ::testing::Test {
 protected:

@@ -10,6 +10,7 @@
 
 #include "backend_fs/meta.h"
 #include "common/tessel_json.h"
+#include "support/json_text.h"
 #include "support/error_stack.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
@@ -21,11 +22,6 @@ using namespace tessel_test;
 
 namespace {
 
-Json::Value Parse(const std::string &strText) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromString(jVal, strText)) << strText;
-    return jVal;
-}
 
 std::string PersonFile(const std::string &strDir, const std::string &strKey) {
     std::string strEncoded;
@@ -33,11 +29,6 @@ std::string PersonFile(const std::string &strDir, const std::string &strKey) {
     return strDir + "/" + strEncoded;
 }
 
-Json::Value ReadJson(const std::string &strPath) {
-    Json::Value jVal;
-    tessel::fromFile(jVal, strPath);
-    return jVal;
-}
 
 TEST(PersonRecords, WritesMergeUnlessCleared) {
     ScratchDir dir;

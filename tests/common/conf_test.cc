@@ -14,6 +14,7 @@
 #include <gtest/gtest.h>
 
 #include "common/tessel_json.h"
+#include "support/json_text.h"
 #include "support/error_stack.h"
 #include "support/process_holding.h"
 #include "support/sandbox.h"
@@ -33,11 +34,6 @@ const std::string kAcNull = "FALSE == TesselSettingsAccessGetEx(jConf, NULL)";
 const std::string kShNs = "FALSE == TesselSettingsSharingGetEx(jConf, szNameSpace, owner)";
 const std::string kShNull = "FALSE == TesselSettingsSharingGetEx(jConf, NULL, owner)";
 
-Json::Value J(const std::string &text) {
-    Json::Value j;
-    EXPECT_TRUE(tessel::fromString(j, text)) << text;
-    return j;
-}
 
 // The first frame's code and every frame's condition text; then a clean stack.
 void ExpectStack(int code, const Msgs &msgs) {
@@ -192,8 +188,8 @@ TEST_F(Conf, WritersChangeOnlyTheirMembers) {
     EXPECT_EQ(0, TesselSettingsSharingSet(nullptr, 1026, 0));
     EXPECT_EQ(0, TesselSettingsSharingSet("ledger", 1026, 1));
     EXPECT_EQ(0, TesselSettingsSharingSet("ledger", 4242, 2));
-    EXPECT_TRUE(TesselSettingsIndexSet("ledger", J(R"({"text":{"title":true},"other":1})")));
-    EXPECT_TRUE(TesselSettingsIndexSet("notes", J(R"({"metatext":{"m":1}})")));
+    EXPECT_TRUE(TesselSettingsIndexSet("ledger", Parse(R"({"text":{"title":true},"other":1})")));
+    EXPECT_TRUE(TesselSettingsIndexSet("notes", Parse(R"({"metatext":{"m":1}})")));
     ExpectStack(0, {});
     const std::string kAll =
         R"({"Access":{"enable":false,"enable_ns_ledger":true},)"
@@ -201,9 +197,9 @@ TEST_F(Conf, WritersChangeOnlyTheirMembers) {
         R"("Sharing":{"1026":{"disable":true,"disable_ns_ledger":false},)"
         R"("4242":{"disable_ns_ledger":true}},"other":{"k":[1,2]},"pkg_id":{"ledger":"LedgerApp"}})";
     EXPECT_EQ(kAll, ReadFile(kConf));
-    EXPECT_FALSE(TesselSettingsIndexSet("", J(R"({"text":1})")));
+    EXPECT_FALSE(TesselSettingsIndexSet("", Parse(R"({"text":1})")));
     ExpectStack(-1, {"strNs.empty() || !jsFilter.isObject()"});
-    EXPECT_FALSE(TesselSettingsIndexSet("ledger", J(R"({"other":1})")));
+    EXPECT_FALSE(TesselSettingsIndexSet("ledger", Parse(R"({"other":1})")));
     ExpectStack(-1, {"!jsFilter.isMember(\"text\") && !jsFilter.isMember(\"metatext\")"});
     EXPECT_EQ(kAll, ReadFile(kConf));
     // What cannot be read is started afresh; a member in the way is replaced.
@@ -233,11 +229,11 @@ TEST_F(Conf, UserCallerReachesRootOnlyFilesAndKeepsItsIds) {
         EXPECT_TRUE(as(!TesselAccessCheck("notes")));
         EXPECT_TRUE(as(0 == TesselSettingsAccessSet("notes", "NotesApp", 1)));
         EXPECT_TRUE(as(0 == TesselSettingsSharingSet("notes", kUidAlice, 0)));
-        EXPECT_TRUE(as(TesselSettingsIndexSet("notes", J(R"({"text":{}})"))));
-        EXPECT_TRUE(as(!TesselSettingsIndexSet("notes", J("{}"))));
+        EXPECT_TRUE(as(TesselSettingsIndexSet("notes", Parse(R"({"text":{}})"))));
+        EXPECT_TRUE(as(!TesselSettingsIndexSet("notes", Parse("{}"))));
         EXPECT_TRUE(as(!TesselSharingCheck("notes", kUidAlice)));
         EXPECT_TRUE(as(TesselSettingsGet("notes", jOut) && TesselSettingsIndexGet("notes", jOut)));
-        EXPECT_EQ(J(R"({"text":{}})"), jOut);
+        EXPECT_EQ(Parse(R"({"text":{}})"), jOut);
         EXPECT_TRUE(as("LEDGER_PRIV" == TesselAppPrivName("ledger") && TesselAppPrivName("absent").empty()));
         EXPECT_TRUE(as(TesselAppPrivName("..").empty()));
         ExpectStack(1007, {"!TesselIsPathComponent(strNs)"});
@@ -325,10 +321,10 @@ void ConfCache::Scenario() {
     Json::Value jOut;
     EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
     EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));  // an empty filter is kept too
-    EXPECT_TRUE(TesselSettingsIndexSet("ledger", J(R"({"text":{"new":true}})")));
-    EXPECT_TRUE(TesselSettingsIndexSet("notes", J(R"({"text":{"new":true}})")));
+    EXPECT_TRUE(TesselSettingsIndexSet("ledger", Parse(R"({"text":{"new":true}})")));
+    EXPECT_TRUE(TesselSettingsIndexSet("notes", Parse(R"({"text":{"new":true}})")));
     EXPECT_TRUE(TesselSettingsIndexGetFromCache("ledger", jOut));
-    EXPECT_EQ(J(R"({"text":{"old":true}})"), jOut);
+    EXPECT_EQ(Parse(R"({"text":{"old":true}})"), jOut);
     EXPECT_TRUE(TesselSettingsIndexGetFromCache("notes", jOut));
     EXPECT_EQ(Json::Value(Json::objectValue), jOut);
     ErrClear();

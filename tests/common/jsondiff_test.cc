@@ -6,15 +6,13 @@
 
 #include "common/tessel_json.h"
 #include "tessel_error.h"
+#include "support/json_text.h"
 #include "tessel_file.h"
 
 namespace {
 
-Json::Value Parse(const std::string &text) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromString(jVal, text)) << text;
-    return jVal;
-}
+using tessel_test::Parse;
+
 
 TEST(JsonDiff, Differences) {
     struct Case {

@@ -14,6 +14,7 @@
 #include <quor/quor.h>
 
 #include "common/tessel_json.h"
+#include "support/json_text.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
 #include "tessel_id.h"
@@ -26,12 +27,8 @@ void PrintTo(const Value &jVal, std::ostream *os) { *os << tessel::toString(jVal
 namespace {
 
 namespace tt = tessel_test;
+using tessel_test::Parse;
 
-Json::Value Parse(const std::string &text) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromString(jVal, text)) << text;
-    return jVal;
-}
 
 TEST(Users, Information) {
     struct Case {

@@ -11,6 +11,7 @@
 #include <quor/qlib.h>
 
 #include "common/tessel_json.h"
+#include "support/json_text.h"
 #include "support/error_stack.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
@@ -35,11 +36,6 @@ const std::string kNewArgs =
     "New_Text|text|{\"b\":\"\xC3\xA9\"}|0\nNew_MetaBinary_info|text|null|0\nNew_Binary_info|text|null|0\n"
     "New_ACL|text|null|0\nNew_CreateTime|text|-1|0\nNew_ModifyTime|text|0|0\nNew_ExtraInfo|text|null|0\n";
 
-Json::Value J(const std::string &text) {
-    Json::Value jVal;
-    EXPECT_TRUE(tessel::fromString(jVal, text)) << text;
-    return jVal;
-}
 
 void Refused(const std::function<bool()> &call, int code, const Msgs &msgs) {
     ErrClear();
@@ -52,14 +48,14 @@ void Refused(const std::function<bool()> &call, int code, const Msgs &msgs) {
 
 TEST(ObjectPlugin, HandsResultAndBothRecordsToThePlugin) {
     TESSEL_OBJECT oldObj, newObj;
-    oldObj.fromJson(J("{\"ns\":\"notes\",\"id\":\"1001_aa\",\"category\":\"memo\",\"version\":\"v1\","
+    oldObj.fromJson(Parse("{\"ns\":\"notes\",\"id\":\"1001_aa\",\"category\":\"memo\",\"version\":\"v1\","
                       "\"commit_msg\":{\"m\":\"old\"},\"parent_id\":\"1001_00\",\"owner\":1001,"
                       "\"metatext\":{\"t\":\"T\"},\"text\":{\"b\":\"a\"},\"acl\":{\"public\":\"ro\"},"
                       "\"ctime\":1700000000,\"mtime\":1700000001}"));
-    oldObj.set_metabinary_info(J("{\"m\":1}"));
-    oldObj.set_binary_info(J("[\"x.bin\"]"));
-    oldObj.set_extra_info(J("{\"k\":true}"));
-    newObj.fromJson(J("{\"id\":\"1001_bb\",\"owner\":-1,\"ctime\":-1,\"text\":{\"b\":\"\xC3\xA9\"}}"));
+    oldObj.set_metabinary_info(Parse("{\"m\":1}"));
+    oldObj.set_binary_info(Parse("[\"x.bin\"]"));
+    oldObj.set_extra_info(Parse("{\"k\":true}"));
+    newObj.fromJson(Parse("{\"id\":\"1001_bb\",\"owner\":-1,\"ctime\":-1,\"text\":{\"b\":\"\xC3\xA9\"}}"));
     TESSEL_OBJECT_ENV env;
     ASSERT_TRUE(TesselObjectPlugin_init(&env, TEST_OBJECT_PLUGIN, &oldObj, &newObj));
     env.result = -7;

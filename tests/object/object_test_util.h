@@ -14,9 +14,12 @@
 #include <json/writer.h>
 #include <quor/qlib.h>
 
+#include "support/json_text.h"
 #include "support/sandbox.h"
 
 namespace object_test {
+
+using tessel_test::Parse;
 
 inline std::string Text(const Json::Value &jVal) {
     Json::StreamWriterBuilder builder;
@@ -25,15 +28,6 @@ inline std::string Text(const Json::Value &jVal) {
     return Json::writeString(builder, jVal);
 }
 
-inline Json::Value Parse(const std::string &strText) {
-    Json::CharReaderBuilder builder;
-    std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-    Json::Value jVal;
-    std::string strErrs;
-    EXPECT_TRUE(reader->parse(strText.data(), strText.data() + strText.size(), &jVal, &strErrs))
-        << strText << ": " << strErrs;
-    return jVal;
-}
 
 // The platform error names module and a line, and the log has, at LOG_ERR,
 // "<module>:<that line> Invaild Argument (<condition>)=[<value>]".
