@@ -31,7 +31,9 @@ constexpr const char SZ_PERSON_SUMMARY_FILE[] = "summary.json";
 constexpr const char SZ_PERSON_CLEAR[] = "@clear";
 constexpr const char SZ_PERSON_DIR[] = "/person";
 
-bool IsPersonKey(const std::string &strKey) { return !strKey.empty() && isdigit(static_cast<unsigned char>(strKey[0])); }
+bool IsPersonKey(const std::string &strKey) {
+    return !strKey.empty() && isdigit(static_cast<unsigned char>(strKey[0]));
+}
 
 // The file that holds the record named strKey ("summary" or a person key).
 bool RecordFile(const std::string &strDir, const std::string &strKey, std::string &strPath) {

@@ -107,7 +107,8 @@ TEST(PersonRecords, TheSelectionDecidesWhatIsRead) {
     jPerson = Json::Value(Json::objectValue);
     ASSERT_TRUE(tessel::ReadPersons(strDir, Parse(R"(["1001", "1009"])"), jPerson));
     EXPECT_EQ(Parse(R"({"1001": {"r": 1}})"), jPerson);
-    EXPECT_TRUE(WaitForSyslog("failed to read [1009] from [" + PersonFile(strDir, "1009") + "]", mark, LOG_USER | LOG_ERR)
+    const std::string strLine = "failed to read [1009] from [" + PersonFile(strDir, "1009") + "]";
+    EXPECT_TRUE(WaitForSyslog(strLine, mark, LOG_USER | LOG_ERR)
                     .has_value());
 }
 
