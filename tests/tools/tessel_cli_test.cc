@@ -1,0 +1,281 @@
+/*
+ * The `tessel` tool as its users run it: the real program in the sandbox,
+ * its JSON on standard output, the error stack on standard error, its exit
+ * codes, the settings file it leaves and the log lines it writes.
+ */
+#include <fcntl.h>
+#include <grp.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "support/json_text.h"
+#include "support/sandbox.h"
+#include "support/scratch.h"
+
+namespace {
+
+using tessel_test::Parse;
+using tessel_test::ReadFile;
+using tessel_test::WriteFile;
+
+const char kConf[] = "/usr/quor/etc/tessel.conf";
+
+/* "  frame (module:123)" lines become "  frame (module)": line numbers move with every edit. */
+std::string WithoutLineNumbers(const std::string &text) {
+    std::istringstream in(text);
+    std::string out;
+    for (std::string line; std::getline(in, line);) {
+        size_t open = line.rfind(" (");
+        size_t colon = line.rfind(':');
+        if (!line.empty() && ')' == line.back() && open != std::string::npos && colon != std::string::npos &&
+            colon > open && colon + 2 < line.size() &&
+            line.find_first_not_of("0123456789", colon + 1) == line.size() - 1) {
+            line.erase(colon, line.size() - 1 - colon);
+        }
+        out += line + "\n";
+    }
+    return out;
+}
+
+struct Result {
+    int code = -1;
+    std::string out;
+    std::string err;  // line numbers of the frames taken out: "(module)"
+};
+
+/*
+ * Runs the tool with args and stdin, as root or (uid != 0) as a user with
+ * all its ids, the way a shell of that user would.
+ */
+Result Tessel(const std::vector<std::string> &args, const std::string &stdinText = "", unsigned uid = 0,
+           unsigned gid = 0) {
+    tessel_test::ScratchDir dir;
+    Result r;
+    if (!dir.ok() || !WriteFile(dir.file("in"), stdinText) || 0 != chmod(dir.path().c_str(), 0777)) {
+        ADD_FAILURE() << "no scratch directory";
+        return r;
+    }
+    pid_t pid = fork();
+    if (0 == pid) {
+        int in = open(dir.file("in").c_str(), O_RDONLY);
+        int out = open(dir.file("out").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0666);
+        int err = open(dir.file("err").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0666);
+        if (in < 0 || out < 0 || err < 0 || dup2(in, 0) < 0 || dup2(out, 1) < 0 || dup2(err, 2) < 0) {
+            _exit(126);
+        }
+        if (0 != uid && (0 != setgroups(0, nullptr) || 0 != setresgid(gid, gid, gid) || 0 != setresuid(uid, uid, uid))) {
+            _exit(126);
+        }
+        std::vector<char *> argv{const_cast<char *>(TESSEL_CLI_PATH)};
+        for (const std::string &a : args) {
+            argv.push_back(const_cast<char *>(a.c_str()));
+        }
+        argv.push_back(nullptr);
+        execv(TESSEL_CLI_PATH, argv.data());
+        _exit(127);
+    }
+    int status = 0;
+    if (pid < 0 || waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) {
+        ADD_FAILURE() << "the tool did not exit normally";
+        return r;
+    }
+    r.code = WEXITSTATUS(status);
+    r.out = ReadFile(dir.file("out"));
+    r.err = WithoutLineNumbers(ReadFile(dir.file("err")));
+    return r;
+}
+
+/* The error stack as the tool prints it for one frame of its own. */
+std::string ToolStack(const std::string &condition, const std::string &errNo) {
+    return "tessel call stack:\n  " + condition + " (tools/tessel)\n  " + errNo + "\n";
+}
+
+class TesselCli : public ::testing::Test {
+protected:
+    void SetUp() override {
+        ASSERT_TRUE(tessel_test::InSandbox());
+        unlink(kConf);
+    }
+};
+
+TEST_F(TesselCli, EveryCommandHasHelpAndWrongCommandLinesExitTwo) {
+    Result list = Tessel({"--help"});
+    ASSERT_EQ(0, list.code);
+    EXPECT_EQ("", list.err);
+    // Every command named in the list answers its own --help.
+    size_t commands = 0;
+    std::istringstream in(list.out);
+    for (std::string text; std::getline(in, text);) {
+        if (text.size() < 3 || 0 != text.compare(0, 2, "  ") || text[2] < 'a' || text[2] > 'z') {
+            continue;
+        }
+        const std::string name = text.substr(2, text.find("  ", 2) - 2);
+        ++commands;
+        std::vector<std::string> args;
+        std::istringstream words(name);
+        for (std::string w; words >> w;) {
+            args.push_back(w);
+        }
+        args.push_back("--help");
+        Result help = Tessel(args);
+        EXPECT_EQ(0, help.code) << name;
+        EXPECT_EQ(0u, help.out.find("Usage: tessel " + name + " ")) << help.out;
+        EXPECT_NE(std::string::npos, help.out.find("  --as UID|NAME ")) << help.out;
+        EXPECT_EQ("", help.err);
+    }
+    EXPECT_GE(commands, 10u);
+
+    Result none = Tessel({});
+    EXPECT_EQ(2, none.code);
+    EXPECT_EQ(list.out, none.out);
+
+    size_t mark = tessel_test::SyslogMark();
+    Result bogus = Tessel({"bogus"});
+    EXPECT_EQ(2, bogus.code);
+    EXPECT_EQ("", bogus.out);
+    EXPECT_EQ(ToolStack("unknown command: bogus", "ErrNo=[1007] (User input error.)") + "Try 'tessel --help'.\n",
+              bogus.err);
+    auto logged = tessel_test::WaitForSyslog("Failed [unknown command: bogus], err=", mark);
+    ASSERT_TRUE(logged.has_value());
+    EXPECT_EQ(0u, logged->message.find("tools/tessel:"));
+
+    Result option = Tessel({"settings", "access", "get", "--nss", "demo"});
+    EXPECT_EQ(2, option.code);
+    EXPECT_EQ(ToolStack("unknown option: --nss", "ErrNo=[1007] (User input error.)") +
+                  "Try 'tessel settings access get --help'.\n",
+              option.err);
+
+    Result value = Tessel({"settings", "access", "get", "--ns"});
+    EXPECT_EQ(2, value.code);
+    EXPECT_EQ(0u, value.err.find(ToolStack("option needs a value: --ns", "ErrNo=[1007] (User input error.)")));
+
+    Result word = Tessel({"settings", "access", "set", "maybe"});
+    EXPECT_EQ(2, word.code);
+    EXPECT_EQ(0u, word.err.find(ToolStack("expected on or off: maybe", "ErrNo=[1007] (User input error.)")));
+    EXPECT_NE(0, access(kConf, F_OK));  // nothing was written
+}
+
+TEST_F(TesselCli, SettingsRoundTripThroughTheFile) {
+    Result off = Tessel({"settings", "access", "get"});
+    EXPECT_EQ(1, off.code);
+    EXPECT_EQ(Parse(R"({"enabled": false, "ns": null})"), Parse(off.out));
+    EXPECT_EQ("tessel call stack:\n  FALSE == QLIBCFileExist(SZF_TESSEL_CONF_PATH) (common/tessel_conf)\n"
+              "  ErrNo=[1027] (tessel is disabled.)\n",
+              off.err);
+
+    Result store = Tessel({"settings", "access", "set", "on"});
+    EXPECT_EQ(0, store.code) << store.err;
+    EXPECT_EQ("{\n  \"enabled\" : true,\n  \"ns\" : null\n}\n", store.out);
+    Result ns = Tessel({"--compact", "settings", "access", "set", "--ns", "ledger", "--pkg", "LedgerApp", "on"});
+    EXPECT_EQ(0, ns.code) << ns.err;
+    EXPECT_EQ("{\"enabled\":true,\"ns\":\"ledger\",\"pkg_id\":\"LedgerApp\"}\n", ns.out);
+    Result sharing = Tessel({"settings", "sharing", "set", "--uid", "bob", "--ns", "ledger", "off"});
+    EXPECT_EQ(0, sharing.code) << sharing.err;
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "uid": 1002, "sharing": false})"), Parse(sharing.out));
+    Result index = Tessel({"settings", "index", "set", "--ns", "ledger", R"({"text": {"title": true}, "other": 1})"});
+    EXPECT_EQ(0, index.code) << index.err;
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"text": {"title": true}}})"), Parse(index.out));
+
+    const Json::Value expected = Parse(R"({"Access": {"enable": true, "enable_ns_ledger": true},
+        "pkg_id": {"ledger": "LedgerApp"}, "Sharing": {"1002": {"disable_ns_ledger": true}},
+        "Index": {"ledger": {"text": {"title": true}}}})");
+    EXPECT_EQ(expected, tessel_test::ReadJson(kConf));
+    Result show = Tessel({"settings", "show", "--ns", "ledger"});
+    EXPECT_EQ(0, show.code);
+    EXPECT_EQ(expected, Parse(show.out));
+
+    Result check = Tessel({"settings", "access", "check", "--ns", "ledger"});
+    EXPECT_EQ(0, check.code);
+    EXPECT_EQ(Parse(R"({"enabled": true, "ns": "ledger"})"), Parse(check.out));
+    EXPECT_EQ("", check.err);
+    Result other = Tessel({"settings", "access", "check", "--ns", "other"});
+    EXPECT_EQ(1, other.code);
+    EXPECT_EQ("tessel call stack:\n"
+              "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
+              "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
+              "  ErrNo=[1012] (Namespace is disabled.)\n",
+              other.err);
+
+    // Sharing: the namespace's own switch, then the check of both.
+    Result get = Tessel({"settings", "sharing", "get", "--uid", "1002"});
+    EXPECT_EQ(0, get.code);
+    EXPECT_EQ(Parse(R"({"ns": null, "uid": 1002, "sharing": true})"), Parse(get.out));
+    Result refused = Tessel({"settings", "sharing", "check", "--uid", "bob", "--ns", "ledger"});
+    EXPECT_EQ(1, refused.code);
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "uid": 1002, "sharing": false})"), Parse(refused.out));
+    EXPECT_EQ("tessel call stack:\n"
+              "  FALSE == TesselSettingsSharingGetEx(jConf, szNameSpace, owner) (common/tessel_conf)\n"
+              "  jConf[\"Sharing\"][szUid][szNSKey].asBool() (common/tessel_conf)\n"
+              "  ErrNo=[1020] (Sharing is not enabled for the object.)\n",
+              refused.err);
+    Result list = Tessel({"settings", "sharing", "off-list", "--ns", "ledger"});
+    EXPECT_EQ(0, list.code);
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "uids": [1002]})"), Parse(list.out));
+    Result filter = Tessel({"settings", "index", "get", "--ns", "ledger"});
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"text": {"title": true}}})"), Parse(filter.out));
+}
+
+TEST_F(TesselCli, BadJsonIsRefusedAndNothingIsWritten) {
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
+    const std::string before = ReadFile(kConf);
+
+    Result cut = Tessel({"settings", "index", "set", "--ns", "ledger", R"({"text":)"});
+    EXPECT_EQ(2, cut.code);
+    EXPECT_EQ("", cut.out);
+    EXPECT_EQ(ToolStack("not JSON in the argument: * Line 1, Column 9   Syntax error: value, object or array expected.",
+                        "ErrNo=[1007] (User input error.)") +
+                  "Try 'tessel settings index set --help'.\n",
+              cut.err);
+
+    Result array = Tessel({"settings", "index", "set", "--ns", "ledger", "-"}, "[1, 2]");
+    EXPECT_EQ(2, array.code);
+    EXPECT_EQ(0u, array.err.find(ToolStack("not a JSON object in standard input", "ErrNo=[1007] (User input error.)")));
+
+    Result twice = Tessel({"settings", "index", "set", "--ns", "ledger", "-"}, R"({"text": {}, "text": {}})");
+    EXPECT_EQ(2, twice.code);
+    EXPECT_EQ(0u, twice.err.find("tessel call stack:\n  not JSON in standard input: ")) << twice.err;
+
+    Result missing = Tessel({"settings", "index", "set", "--ns", "ledger", "@/tmp/no-such-filter.json"});
+    EXPECT_EQ(2, missing.code);
+    EXPECT_EQ(0u, missing.err.find(ToolStack("cannot read /tmp/no-such-filter.json", "ErrNo=[1002] (Open File failed.)")));
+
+    // A well-formed filter the library refuses: its frames, exit code 1.
+    Result empty = Tessel({"settings", "index", "set", "--ns", "ledger", "{}"});
+    EXPECT_EQ(1, empty.code);
+    EXPECT_EQ("tessel call stack:\n"
+              "  !jsFilter.isMember(\"text\") && !jsFilter.isMember(\"metatext\") (common/tessel_conf)\n",
+              empty.err);
+    EXPECT_EQ(before, ReadFile(kConf));
+}
+
+TEST_F(TesselCli, AsNamesTheRequesterAndTakesItsIds) {
+    // Run as root, --as makes the call with the user's effective ids: the
+    // library's raise to root and the way back are logged with them.
+    size_t mark = tessel_test::SyslogMark();
+    Result alice = Tessel({"--as", "alice", "settings", "index", "set", "--ns", "ledger", "-"}, R"({"metatext": {}})");
+    EXPECT_EQ(0, alice.code) << alice.err;
+    EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"metatext": {}}})"), Parse(alice.out));
+    EXPECT_TRUE(tessel_test::WaitForSyslog("WARNING: setresuid(-1, 1001, -1)", mark).has_value());
+
+    Result unknown = Tessel({"settings", "access", "get", "--as", "nosuch"});
+    EXPECT_EQ(2, unknown.code);
+    EXPECT_EQ(0u, unknown.err.find(ToolStack("NULL == getpwnam(\"nosuch\")", "ErrNo=[1022] (User not exists.)")));
+    Result noEntry = Tessel({"--as", "4242", "settings", "access", "get"});
+    EXPECT_EQ(2, noEntry.code);
+    EXPECT_EQ(0u, noEntry.err.find(ToolStack("NULL == getpwuid(4242)", "ErrNo=[1022] (User not exists.)")));
+
+    // A user's own shell can name only itself.
+    Result bob = Tessel({"--as", "alice", "settings", "access", "get"}, "", tessel_test::kUidBob, tessel_test::kGidUsers);
+    EXPECT_EQ(2, bob.code);
+    EXPECT_EQ(0u, bob.err.find(ToolStack("--as names another user and the caller is not root",
+                                         "ErrNo=[1007] (User input error.)")));
+}
+
+}  // namespace
