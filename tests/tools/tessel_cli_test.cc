@@ -278,4 +278,45 @@ TEST_F(TesselCli, AsNamesTheRequesterAndTakesItsIds) {
                                          "ErrNo=[1007] (User input error.)")));
 }
 
+TEST_F(TesselCli, GetPassesParametersAndShowsTheLibrarysRefusals) {
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "--ns", "ledger", "on"}).code);
+
+    // A namespace that is off: the read's own frame over the settings' frames.
+    Result off = Tessel({"--as", "alice", "get", "--ns", "other", "--id", "1001_X"});
+    EXPECT_EQ(1, off.code);
+    EXPECT_EQ("", off.out);
+    EXPECT_EQ("tessel call stack:\n"
+              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n"
+              "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
+              "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
+              "  ErrNo=[1012] (Namespace is disabled.)\n",
+              off.err);
+
+    // PARAMS reach the library as given; the options win over them.
+    Result type = Tessel({"--as", "alice", "get", "-"}, R"({"ns": 5, "id": "1001_X"})");
+    EXPECT_EQ(1, type.code);
+    EXPECT_EQ("tessel call stack:\n"
+              "  !jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"id\") || "
+              "!jParm[\"id\"].isString() || !jParm.isMember(\"requester\") || !jParm[\"requester\"].isIntegral() "
+              "(object/object_get)\n"
+              "  ErrNo=[1007] (User input error.)\n",
+              type.err);
+    Result fixed = Tessel({"--as", "alice", "get", R"({"ns": 5, "id": "1001_X"})", "--ns", "other"});
+    EXPECT_EQ(1, fixed.code);
+    EXPECT_EQ(off.err, fixed.err);
+
+    Result field = Tessel({"get", R"({"field": []})", "--ns", "ledger", "--field", "text"});
+    EXPECT_EQ(2, field.code);
+    EXPECT_EQ(0u, field.err.find(ToolStack("--field needs \"field\" of PARAMS to be an object",
+                                           "ErrNo=[1007] (User input error.)")));
+
+    // A user's shell cannot read for another user by naming them in PARAMS.
+    Result bob = Tessel({"get", R"({"ns": "ledger", "id": "1001_X", "requester": 1001})"}, "", tessel_test::kUidBob,
+                        tessel_test::kGidUsers);
+    EXPECT_EQ(2, bob.code);
+    EXPECT_EQ(0u, bob.err.find(ToolStack("\"requester\" names another user and the caller is not root",
+                                         "ErrNo=[1007] (User input error.)")));
+}
+
 }  // namespace

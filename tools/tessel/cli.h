@@ -65,6 +65,11 @@ struct Command {
 const std::vector<Command> &Commands();
 /* Appends the commands of one area to the table (called once per area). */
 void AddSettingsCommands(std::vector<Command> &table);
+void AddGetCommands(std::vector<Command> &table);
+void AddCreateSetCommands(std::vector<Command> &table);
+void AddVersionCommands(std::vector<Command> &table);
+void AddDownloadCommands(std::vector<Command> &table);
+void AddReindexCommands(std::vector<Command> &table);
 
 /* ---- errors -------------------------------------------------------------- */
 

@@ -19,6 +19,7 @@ namespace tessel_cli {
 const std::vector<Command> &Commands() {
     static const std::vector<Command> table = [] {
         std::vector<Command> t;
+        AddGetCommands(t);
         AddSettingsCommands(t);
         return t;
     }();
