@@ -1,4 +1,5 @@
-// Person records of an object, one JSON file per person; see meta.h.
+// Person records of an object, one JSON file per person (see meta.h), and the
+// object's meta-binaries: unversioned files beside their descriptions.
 #include "backend_fs/meta.h"
 
 #include <ctype.h>
@@ -7,11 +8,15 @@
 #include <stdio.h>
 #include <unistd.h>
 
+#include <time.h>
+
 #include <memory>
 #include <set>
 #include <string>
 #include <vector>
 
+#include "backend_fs/tesselBackend_fs.h"
+#include "backend_fs/utils.h"
 #include "common/tessel_json.h"
 #include "common/tessel_pathname.h"
 #include "common/tessel_priv.h"
@@ -220,4 +225,161 @@ BOOL TesselUpdatePerson(TESSEL_OBJECT *pObj, unsigned int uid) {
     jPerson[strKey] = jsUser;
     pObj->swap_person(jPerson);
     return TRUE;
+}
+
+// ---- meta-binaries ------------------------------------------------------------
+
+namespace {
+
+constexpr const char SZK_METABINARY_FILES[] = "metabinary_files";
+constexpr const char SZK_METABINARY_INFO[] = "metabinary_info";
+constexpr const char SZ_FORMAT_DELETE[] = "delete";
+constexpr const char SZ_FORMAT_OBJECT[] = "object";
+constexpr const char SZ_FORMAT_RAW[] = "raw";
+constexpr const char SZ_FORMAT_BASE64[] = "base64";
+
+// The stored description's time, or -1 when there is none.
+long long StoredMtime(const std::string &strInfo) {
+    Json::Value jInfo;
+    if (!tessel::fromFile(jInfo, strInfo) || !jInfo.isObject() || !jInfo["auto_mtime"].isIntegral()) {
+        return -1;
+    }
+    return jInfo["auto_mtime"].asInt64();
+}
+
+// Decodes the base64 file strSrc into strDest.
+bool DecodeBase64File(const std::string &strSrc, const std::string &strDest) {
+    std::string strText;
+    TESSEL_CHECK_APPEND(!tessel::FsReadWholeFile(strSrc, strText), "!FsReadWholeFile(strFileTmp, strText)", false);
+    size_t nDecoded = strText.size() / 4 * 3 + 3;
+    std::string strData(nDecoded, '\0');
+    TESSEL_CHECK(!QLIBCBase64Decode(strText.c_str(), strText.size(), &strData[0], &nDecoded), TESSEL_ERR_USER_INPUT,
+                 "!QLIBCBase64Decode(strText.c_str(), strText.size(), &strData[0], &nDecoded)", false);
+    strData.resize(nDecoded);
+    TESSEL_CHECK_APPEND(!TesselRawToFile(strData, strDest), "!TesselRawToFile(strData, strDecoded)", false);
+    return true;
+}
+
+}  // namespace
+
+bool TESSEL_BACKEND_FS::mf_GetMetaBinaryInfo(TESSEL_OBJECT *pObject, bool blForce) {
+    const std::string strDir = m_jPathInfo[TESSEL_META_BIN_INFO].asString();
+    Json::Value jOut(Json::objectValue);
+    if (blForce) {
+        // Every description, whatever the request selected.
+        TESSEL_CHECK_APPEND(!tessel::FsReadBinaryInfos(strDir, Json::Value(), jOut[SZK_METABINARY_INFO]),
+                            "!FsReadBinaryInfos(strDir, Json::Value(), jOut[\"metabinary_info\"])", false);
+    } else {
+        TESSEL_CHECK_APPEND(!mf_GetBinaryInfoByDir(strDir, jOut, SZK_METABINARY_INFO),
+                            "!mf_GetBinaryInfoByDir(strDir, jOut, \"metabinary_info\")", false);
+    }
+    pObject->swap_metabinary_info(jOut[SZK_METABINARY_INFO]);
+    return true;
+}
+
+/*
+ * Each item of "metabinary_files" stores, replaces or removes one file. Like
+ * the meta-text entries, a file never loses to an older request: an item is
+ * passed over when the stored description's "auto_mtime" is newer than the
+ * request's "mtime" (a request without one counts as made now). Base64
+ * uploads are decoded into the request's own work area, which is removed
+ * again; the uploaded files themselves belong to the caller and stay.
+ */
+bool TESSEL_BACKEND_FS::mf_SaveMetaBinary() {
+    const Json::Value &jParm = m_jParm;
+    const Json::Value &jArray = jParm[SZK_METABINARY_FILES];
+    TESSEL_CHECK(!jArray.isArray(), TESSEL_ERR_BAD_PARAMETERS, "!m_jParm[\"metabinary_files\"].isArray()", false);
+    TESSEL_CHECK(jParm.isMember("mtime") && !jParm["mtime"].isIntegral(), TESSEL_ERR_BAD_PARAMETERS,
+                 "m_jParm.isMember(\"mtime\") && !m_jParm[\"mtime\"].isIntegral()", false);
+    const int64_t mtime = jParm["mtime"].isIntegral() ? jParm["mtime"].asInt64() : (int64_t)time(NULL);
+    const std::string strBinDir = m_jPathInfo[TESSEL_META_BIN].asString();
+    const std::string strInfoDir = m_jPathInfo[TESSEL_META_BIN_INFO].asString();
+    for (Json::ArrayIndex i = 0; i < jArray.size(); ++i) {
+        TESSEL_CHECK(!jArray[i].isObject(), TESSEL_ERR_BAD_PARAMETERS, "!jArray[i].isObject()", false);
+        TESSEL_CHECK(!jArray[i].isMember("name"), TESSEL_ERR_BAD_PARAMETERS, "!jArray[i].isMember(\"name\")", false);
+        TESSEL_CHECK(!jArray[i].isMember("format"), TESSEL_ERR_BAD_PARAMETERS, "!jArray[i].isMember(\"format\")",
+                     false);
+        TESSEL_CHECK(!jArray[i]["name"].isString(), TESSEL_ERR_BAD_PARAMETERS, "!jArray[i][\"name\"].isString()",
+                     false);
+        const std::string strFileName = jArray[i]["name"].asString();
+        const std::string strFormat = jArray[i]["format"].isString() ? jArray[i]["format"].asString() : "";
+        if (SZ_FORMAT_DELETE != strFormat && SZ_FORMAT_OBJECT != strFormat && SZ_FORMAT_RAW != strFormat &&
+            SZ_FORMAT_BASE64 != strFormat) {
+            TESSEL_LOG(LOG_ERR, "bad binary file format, json=%s\n", tessel::toString(jArray[i]).c_str());
+            continue;
+        }
+        std::string strFileNameEncode;
+        TESSEL_CHECK_APPEND(!TesselEncode(strFileName, strFileNameEncode),
+                            "!TesselEncode(jArray[i][\"name\"].asString(), strFileNameEncode)", false);
+        const std::string strFileNew = strBinDir + "/" + strFileNameEncode;
+        const std::string strInfoNew = strInfoDir + "/" + strFileNameEncode;
+        TESSEL_AS_ROOT();
+        if (StoredMtime(strInfoNew) > mtime) {
+            continue;
+        }
+
+        if (SZ_FORMAT_DELETE == strFormat) {
+            TESSEL_CHECK(0 != unlink(strFileNew.c_str()) && ENOENT != errno, TESSEL_ERR_OPERATION_FAILED,
+                         "0 != unlink(strFileNew.c_str()) && ENOENT != errno", false);
+            TESSEL_CHECK(0 != unlink(strInfoNew.c_str()) && ENOENT != errno, TESSEL_ERR_OPERATION_FAILED,
+                         "0 != unlink(strInfoNew.c_str()) && ENOENT != errno", false);
+        } else if (SZ_FORMAT_OBJECT == strFormat) {
+            Json::Value jPathInfoTmp;
+            TESSEL_CHECK_APPEND(!mf_GetBinaryObjectPath(jArray[i], jPathInfoTmp),
+                                "!mf_GetBinaryObjectPath(jArray[i], jPathInfoTmp)", false);
+            const std::string strFileSrc = jPathInfoTmp[TESSEL_META_BIN].asString() + "/" + strFileNameEncode;
+            const std::string strInfoSrc = jPathInfoTmp[TESSEL_META_BIN_INFO].asString() + "/" + strFileNameEncode;
+            TESSEL_CHECK(!QLIBCFileExist(strFileSrc.c_str()), TESSEL_ERR_UNEXPECTED,
+                         "!QLIBCFileExist(strFileSrc.c_str())", false);
+            TESSEL_CHECK_APPEND(!mf_CopyFile(strFileSrc, strFileNew), "!mf_CopyFile(strFileSrc, strFileNew)", false);
+            // The source's description comes along (a download name, say);
+            // digest, name and time are then made this object's own.
+            if (QLIBCFileExist(strInfoSrc.c_str())) {
+                TESSEL_CHECK_APPEND(!mf_CopyFile(strInfoSrc, strInfoNew), "!mf_CopyFile(strInfoSrc, strInfoNew)",
+                                    false);
+            }
+            TESSEL_CHECK_APPEND(!mf_MakeBinaryInfo(strFileNew, strFileName, mtime, true),
+                                "!mf_MakeBinaryInfo(strFileNew, strFileName, m_jParm[\"mtime\"].asInt64(), true)",
+                                false);
+        } else {
+            TESSEL_CHECK(!jArray[i].isMember("path"), TESSEL_ERR_BAD_PARAMETERS, "!jArray[i].isMember(\"path\")",
+                         false);
+            TESSEL_CHECK(!jArray[i]["path"].isString(), TESSEL_ERR_BAD_PARAMETERS,
+                         "!jArray[i][\"path\"].isString()", false);
+            std::string strFileTmp = jArray[i]["path"].asString();
+            const std::string strWorkDir = m_jPathInfo[TESSEL_TMP_PATH].asString();
+            const bool blDecode = SZ_FORMAT_BASE64 == strFormat;
+            if (blDecode) {
+                TESSEL_CHECK(!TesselRootFSMkdirP(strWorkDir.c_str(), 0), TESSEL_ERR_MKDIR,
+                             "!TesselRootFSMkdirP(m_jPathInfo[TESSEL_TMP_PATH].asCString(), 0)", false);
+                const std::string strDecoded = strWorkDir + "/" + strFileNameEncode;
+                const bool blOk = DecodeBase64File(strFileTmp, strDecoded);
+                strFileTmp = strDecoded;
+                if (!blOk) {
+                    unlink(strDecoded.c_str());
+                    rmdir(strWorkDir.c_str());
+                    TESSEL_APPEND("!DecodeBase64File(jArray[i][\"path\"].asString(), strDecoded)");
+                    return false;
+                }
+            }
+            const bool blCopied = mf_CopyFile(strFileTmp, strFileNew);
+            if (blDecode) {
+                unlink(strFileTmp.c_str());
+                rmdir(strWorkDir.c_str());
+            }
+            TESSEL_CHECK_APPEND(!blCopied, "!mf_CopyFile(strFileTmp, strFileNew)", false);
+            TESSEL_CHECK_APPEND(!mf_MakeBinaryInfo(strFileNew, strFileName, mtime, false),
+                                "!mf_MakeBinaryInfo(strFileNew, strFileName, m_jParm[\"mtime\"].asInt64(), false)",
+                                false);
+        }
+    }
+    return true;
+}
+
+bool TESSEL_BACKEND_FS::mf_DownloadMetaBinary() {
+    const std::string strBinaryDir = m_jPathInfo[TESSEL_META_BIN].asString();
+    const std::string strBinaryInfoDir = m_jPathInfo[TESSEL_META_BIN_INFO].asString();
+    TESSEL_CHECK_APPEND(!mf_DownloadBinaryByDir(strBinaryDir, strBinaryInfoDir),
+                        "!mf_DownloadBinaryByDir(strBinaryDir, strBinaryInfoDir)", false);
+    return true;
 }

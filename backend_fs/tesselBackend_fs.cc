@@ -455,7 +455,7 @@ bool TESSEL_BACKEND_FS::mf_SavePerson() {
     return true;
 }
 
-// ---- versioned fields and meta-binaries -----------------------------------------
+// ---- versioned fields -------------------------------------------------------------
 // Their store is not built yet. The call sites above are final; these say
 // honestly what they cannot do instead of pretending to have stored or read.
 
@@ -473,24 +473,9 @@ bool TESSEL_BACKEND_FS::mf_SaveGit(std::string &) {
     return false;
 }
 
-bool TESSEL_BACKEND_FS::mf_SaveMetaBinary() {
-    TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "meta-binaries are not stored yet");
-    return false;
-}
-
-bool TESSEL_BACKEND_FS::mf_GetMetaBinaryInfo(TESSEL_OBJECT *, bool) {
-    TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "meta-binaries are not read yet");
-    return false;
-}
-
-// ---- versions, downloads and renames --------------------------------------
+// ---- versions and renames --------------------------------------------------
 // These belong to the version store, which is not built yet: each fails
 // loudly rather than pretend to have read or written anything.
-
-bool TESSEL_BACKEND_FS::Download(const Json::Value &) {
-    TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "TESSEL_BACKEND_FS::Download is not available yet");
-    return false;
-}
 
 bool TESSEL_BACKEND_FS::FieldRename(const Json::Value &, std::string &) {
     TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "TESSEL_BACKEND_FS::FieldRename is not available yet");

@@ -11,6 +11,8 @@
 #ifndef TESSEL_BACKEND_FS_TESSELBACKEND_FS_H
 #define TESSEL_BACKEND_FS_TESSELBACKEND_FS_H
 
+#include <stdint.h>
+
 #include <string>
 #include <vector>
 
@@ -69,6 +71,27 @@ private:
     bool mf_SaveGit(std::string &strNewVer);
     bool mf_GetPerson(TESSEL_OBJECT *pObject);
     bool mf_SavePerson();
+
+    /*
+     * Stored files and their descriptions. A file ".../binary/<enc>" or
+     * ".../metabinary/<enc>" is described by the file of the same name in
+     * the sibling "binary_info" or "metabinary_info".
+     */
+    bool mf_GetBinaryInfoPath(const std::string &strFile, std::string &strInfo);
+    /* Describes strFile: {"md5", "name", "auto_mtime"}. blMerge keeps the
+     * other members of a description already there (a copy from another
+     * object brings its source's description along). */
+    bool mf_MakeBinaryInfo(const std::string &strFile, const std::string &strFileName, int64_t mtime,
+                           bool blMerge);
+    /* jOut[szMember] = every description of strDir (the request's
+     * field[szMember] may name the files wanted). */
+    bool mf_GetBinaryInfoByDir(const std::string &strDir, Json::Value &jOut, const char *szMember);
+    bool mf_CopyFile(const std::string &strSrc, const std::string &strDest);
+    /* The path information of the object jItem["id"] of the request's namespace. */
+    bool mf_GetBinaryObjectPath(const Json::Value &jItem, Json::Value &jPathInfo);
+    /* Sends the request's "field" from strBinaryDir as the HTTP response. */
+    bool mf_DownloadBinaryByDir(const std::string &strBinaryDir, const std::string &strBinaryInfoDir);
+    bool mf_DownloadMetaBinary();
 
     Json::Value m_jParm;
     Json::Value m_jPathInfo;
