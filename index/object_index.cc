@@ -4,7 +4,9 @@
 // namespace's index filter drops the members it does not want searchable.
 //
 // The source sits with the index, below the object operations, but callers
-// know it as part of the object layer, hence its module name.
+// know it as part of the object layer, hence its module name. Reading an
+// object by id is the one call from here up into the object layer; it stays
+// behind ReadForIndex so that the cycle has a single, named place.
 #include <climits>
 #include <cstdlib>
 #include <memory>
@@ -218,6 +220,21 @@ bool CreateValues(std::string &strObjectValue, std::string &strPersonValue, cons
     return true;
 }
 
+// The read parameters of an object as the index wants it: every field, the
+// text already narrowed by the namespace's filter.
+Json::Value GetParm(const char *szID, const char *szNs, unsigned int requester, unsigned int owner) {
+    Json::Value jGetParm(Json::objectValue);
+    jGetParm["ns"] = szNs;
+    jGetParm["id"] = szID;
+    jGetParm["requester"] = requester;
+    jGetParm["owner"] = owner;
+    jGetParm["field"] = TesselObjectFieldAll();
+    return jGetParm;
+}
+
+// The object get of the object layer, the only call upward from here.
+bool ReadForIndex(TESSEL_OBJECT &Object, const Json::Value &jGetParm) { return Object.Get(jGetParm); }
+
 }  // namespace
 
 bool TesselObjectIndexEx(DBConnect_tag *pConn, TESSEL_OBJECT *pObj) {
@@ -240,6 +257,37 @@ bool TesselObjectIndexEx(DBConnect_tag *pConn, TESSEL_OBJECT *pObj) {
     TESSEL_CHECK(!szSQLUpsert, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
     TESSEL_CHECK((0 != QUORDBExecute(pConn, szSQLUpsert.get(), NULL)), TESSEL_ERR_OPERATION_FAILED,
                  "(0 != QUORDBExecute(pConn, szSQLUpsert, NULL))", false);
+    return true;
+}
+
+bool TesselObjectIndexEx(DBConnect_tag *pConn, const char *szID, const char *szNs, unsigned int requester) {
+    TESSEL_CHECK(NULL == szID || NULL == szNs, TESSEL_ERR_BAD_PARAMETERS, "NULL == szID || NULL == szNs", false);
+    Json::Value jGetParm = GetParm(szID, szNs, requester, requester);
+    TESSEL_CHECK_APPEND(!TesselSettingsIndexGetFromCache(szNs, jGetParm["field_filter"]),
+                        "!TesselSettingsIndexGetFromCache(szNs, jGetParm[\"field_filter\"])", false);
+    TESSEL_OBJECT Object;
+    TESSEL_CHECK_APPEND(!ReadForIndex(Object, jGetParm), "!Object.Get(jGetParm)", false);
+    TESSEL_CHECK_APPEND(!TesselObjectIndexEx(pConn, &Object), "!TesselObjectIndexEx(pConn, &Object)", false);
+    return true;
+}
+
+bool TesselObjectIndex(const char *szID, const char *szNs, unsigned int requester) {
+    DBConnect_tag *pConn = NULL;
+    TESSEL_CHECK_APPEND(NULL == (pConn = TesselOpenConn()), "NULL == (pConn = TesselOpenConn())", false);
+    TESSEL_CHECK_APPEND(!TesselObjectIndexEx(pConn, szID, szNs, requester),
+                        "!TesselObjectIndexEx(pConn, szID, szNs, requester)", false);
+    return true;
+}
+
+bool TesselObjectCreateIndexValue(std::string &strObjectValues, std::string &strPersonValues, const char *szID,
+                                  const char *szNs, unsigned int owner, const Json::Value &jsFilter) {
+    TESSEL_CHECK(NULL == szID || NULL == szNs, TESSEL_ERR_BAD_PARAMETERS, "NULL == szID || NULL == szNs", false);
+    Json::Value jGetParm = GetParm(szID, szNs, owner, owner);
+    jGetParm["field_filter"] = jsFilter;
+    TESSEL_OBJECT Object;
+    TESSEL_CHECK_APPEND(!ReadForIndex(Object, jGetParm), "!Object.Get(jGetParm)", false);
+    TESSEL_CHECK_APPEND(!CreateValues(strObjectValues, strPersonValues, &Object, jsFilter),
+                        "!CreateValues(strObjectValues, strPersonValues, &Object, jsFilter)", false);
     return true;
 }
 

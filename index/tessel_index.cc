@@ -1,9 +1,14 @@
 // The process's connection to the index database, the schema it needs, and
 // the vacuum counter that every closing of that connection advances.
+#include <glob.h>
 #include <sys/file.h>
+#include <syslog.h>
 #include <unistd.h>
 
+#include <cstdlib>
+#include <cstring>
 #include <mutex>
+#include <string>
 
 #include <json/value.h>
 #include <quor/qlib.h>
@@ -12,7 +17,10 @@
 #include "common/tessel_json.h"
 #include "common/tessel_priv.h"
 #include "common/tessel_report.h"
+#include "tessel_conf.h"
+#include "tessel_id.h"
 #include "tessel_index.h"
+#include "tessel_ns.h"
 
 static constexpr const char kTesselModule[] = "index/tessel_index";
 
@@ -45,6 +53,22 @@ constexpr char SZ_SQL_CREATE_PERSON_TABLE[] =
     "BEGIN;CREATE TABLE IF NOT EXISTS person(id text PRIMARY KEY, person json );"
     "CREATE INDEX person_id ON person (id);END;";
 constexpr char SZ_SQL_VACUUM[] = "VACUUM ANALYZE";
+constexpr char SZ_SQL_DELETE_NS[] =
+    "DELETE FROM person WHERE id IN (SELECT id FROM object WHERE ns='@QUOR:VAR');"
+    "DELETE FROM person WHERE id NOT IN (SELECT id FROM object);"
+    "DELETE FROM object WHERE ns='@QUOR:VAR';";
+constexpr char SZ_SQL_DELETE_ALL[] = "DELETE FROM person;DELETE FROM object;";
+constexpr char SZ_SQL_VACUUM_OBJECT[] = "VACUUM FULL object;";
+constexpr char SZ_SQL_VACUUM_PERSON[] = "VACUUM FULL person;";
+constexpr char SZK_NS[] = "ns";
+constexpr char SZK_ID[] = "id";
+constexpr char SZ_SQL_OBJECT_PREFIX[] =
+    "INSERT INTO object (id, ns, owner, category, parent_id, version, commit_msg, acl, text, metatext, "
+    "binary_info, metabinary_info, ctime, mtime, extra_info) VALUES ";
+constexpr char SZ_SQL_PERSON_PREFIX[] = "INSERT INTO person (id, person) VALUES ";
+// Rows per bulk insert: big enough to save round trips, small enough to keep
+// one failing object from costing more than a few neighbours' statement.
+constexpr size_t kReindexBatch = 30;
 
 constexpr char SZF_VACUUM_COUNTER[] = "/tmp/tessel.tmp";
 constexpr char SZF_VACUUM_COUNTER_LOCK[] = "/tmp/tessel.tmp.lock";
@@ -139,6 +163,146 @@ void CountClosing() {
     close(fd);
 }
 
+// Empties the index of jParam's "ns", or all of it, and gives the space back.
+// A parameter that is neither an object nor null names no scope, and a
+// namespace that is not a string names none either: both are refused rather
+// than read as "everything".
+bool clear_index(DBConnect_tag *pConn, const Json::Value &jParam) {
+    TESSEL_CHECK(!jParam.isNull() && !jParam.isObject(), TESSEL_ERR_USER_INPUT, "!jParam.isObject()", false);
+    const bool blOneNs = jParam.isObject() && jParam.isMember(SZK_NS);
+    TESSEL_CHECK(blOneNs && !jParam[SZK_NS].isString(), TESSEL_ERR_USER_INPUT, "!jParam[\"ns\"].isString()", false);
+    char *szSQLDelete = NULL;
+    if (blOneNs) {
+        // The wrapper takes C strings; a name with a NUL byte would name
+        // another namespace there.
+        const std::string strNs = jParam[SZK_NS].asString();
+        if (std::string::npos == strNs.find('\0')) {
+            szSQLDelete = QUORDBEscapeStringEX3(QUOR_DB_PGSQL, SZ_SQL_DELETE_NS, strNs.c_str(), strNs.c_str());
+        }
+    } else {
+        szSQLDelete = strdup(SZ_SQL_DELETE_ALL);
+    }
+    TESSEL_CHECK(NULL == szSQLDelete, TESSEL_ERR_OPERATION_FAILED, "NULL == szSQLDelete", false);
+    const int ret = QUORDBExecute(pConn, szSQLDelete, NULL);
+    free(szSQLDelete);
+    TESSEL_CHECK(0 > ret, TESSEL_ERR_OPERATION_FAILED, "0 > QUORDBExecute(pConn, szSQLDelete, NULL)", false);
+    TESSEL_CHECK(0 > QUORDBExecute(pConn, SZ_SQL_VACUUM_OBJECT, NULL), TESSEL_ERR_OPERATION_FAILED,
+                 "0 > QUORDBExecute(pConn, \"VACUUM FULL object;\", NULL)", false);
+    TESSEL_CHECK(0 > QUORDBExecute(pConn, SZ_SQL_VACUUM_PERSON, NULL), TESSEL_ERR_OPERATION_FAILED,
+                 "0 > QUORDBExecute(pConn, \"VACUUM FULL person;\", NULL)", false);
+    return true;
+}
+
+// A path as a glob pattern that matches only itself: namespace names may
+// hold the pattern characters.
+std::string GlobLiteral(const std::string &strPath) {
+    std::string strOut;
+    for (char c : strPath) {
+        if ('*' == c || '?' == c || '[' == c || '\\' == c) {
+            strOut += '\\';
+        }
+        strOut += c;
+    }
+    return strOut;
+}
+
+struct GlobList {
+    glob_t buf = {};
+    ~GlobList() { globfree(&buf); }
+};
+
+// The entries of strPattern; an empty list when nothing matches. Object and
+// namespace directories are the store's, so they are listed as root.
+int ListAsRoot(const std::string &strPattern, GlobList &list) {
+    TESSEL_AS_ROOT();
+    int ret = glob(strPattern.c_str(), GLOB_ERR, NULL, &list.buf);
+    return (GLOB_NOMATCH == ret) ? 0 : ret;
+}
+
+// Sends the pending tuples as one insert per table and empties them.
+bool FlushReindex(DBConnect_tag *pConn, std::string &strSQL, std::string &strPerson) {
+    if (strSQL.empty()) {
+        return true;
+    }
+    strSQL += ";";
+    strPerson += ";";
+    TESSEL_CHECK(0 > QUORDBExecute(pConn, (SZ_SQL_OBJECT_PREFIX + strSQL).c_str(), NULL), TESSEL_ERR_OPERATION_FAILED,
+                 "0 > QUORDBExecute(pConn, (SZ_SQL_OBJECT_PREFIX + strSQL).c_str(), NULL)", false);
+    TESSEL_CHECK(0 > QUORDBExecute(pConn, (SZ_SQL_PERSON_PREFIX + strPerson).c_str(), NULL),
+                 TESSEL_ERR_OPERATION_FAILED, "0 > QUORDBExecute(pConn, (SZ_SQL_PERSON_PREFIX + strPerson).c_str(), NULL)",
+                 false);
+    strSQL.clear();
+    strPerson.clear();
+    return true;
+}
+
+// Indexes every object directory below strNsPath. An object that cannot be
+// read is logged and left out, so that one damaged object does not keep the
+// rest of its namespace out of the index.
+bool ReindexNs(DBConnect_tag *pConn, const std::string &strNsPath, const std::string &strNs) {
+    const char *szNs = strNs.c_str();
+    Json::Value jsFilter;
+    TESSEL_CHECK_APPEND(!TesselSettingsIndexGet(szNs, jsFilter), "!TesselSettingsIndexGet(szNs, jsFilter)", false);
+    GlobList objects;
+    const std::string strPattern = GlobLiteral(strNsPath) + "/*";
+    TESSEL_CHECK(0 != ListAsRoot(strPattern, objects), TESSEL_ERR_OPERATION_FAILED,
+                 "0 != glob(strPattern.c_str(), GLOB_ERR, NULL, &Globbuf)", false);
+    const size_t prefixLen = strNsPath.size() + 1;
+    std::string strSQL;
+    std::string strPerson;
+    for (size_t count = 1; count <= objects.buf.gl_pathc; ++count) {
+        const std::string strId = std::string(objects.buf.gl_pathv[count - 1]).substr(prefixLen);
+        const unsigned int owner = TesselObjectGetOwnerByID(strId);
+        std::string strObjectValue;
+        std::string strPersonValue;
+        if (!TesselObjectCreateIndexValue(strObjectValue, strPersonValue, strId.c_str(), szNs, owner, jsFilter)) {
+            TESSEL_LOG(LOG_ERR, "fail to reindex object ns=%s, id=%s, owner=%u", szNs, strId.c_str(), owner);
+        } else {
+            strSQL.append(strSQL.empty() ? "" : ",").append(strObjectValue);
+            strPerson.append(strPerson.empty() ? "" : ",").append(strPersonValue);
+        }
+        if (0 == count % kReindexBatch && !FlushReindex(pConn, strSQL, strPerson)) {
+            return false;
+        }
+    }
+    return FlushReindex(pConn, strSQL, strPerson);
+}
+
+// Every namespace folder of the store, each under its folder's name. A
+// namespace that fails does not keep the others out; the result reports it.
+bool ReindexAll(DBConnect_tag *pConn) {
+    std::string strRepo;
+    TESSEL_CHECK_APPEND(!TesselGetRepoDir(strRepo), "!TesselGetRepoDir(strRepo)", false);
+    GlobList namespaces;
+    const std::string strTesselPath = GlobLiteral(strRepo) + "/*";
+    TESSEL_CHECK(0 != ListAsRoot(strTesselPath, namespaces), TESSEL_ERR_OPERATION_FAILED,
+                 "0 != glob(strTesselPath.c_str(), GLOB_ERR, NULL, &Globbuf)", false);
+    bool blOk = true;
+    for (size_t i = 0; i < namespaces.buf.gl_pathc; ++i) {
+        const std::string strNsPath = namespaces.buf.gl_pathv[i];
+        const std::string strNs = strNsPath.substr(strRepo.size() + 1);
+        if (!ReindexNs(pConn, strNsPath, strNs)) {
+            TESSEL_APPEND("!ReindexNs(pConn, strNsPath, strNs)");
+            blOk = false;
+        }
+    }
+    return blOk;
+}
+
+// The object the parameter names, when it names one, indexed once more on
+// its own: a caller that re-indexes on behalf of one object gets that
+// object's row from a read of its own, whatever the folder listing held.
+bool TesselIndex(DBConnect_tag *pConn, const Json::Value &jParam) {
+    if (!jParam.isObject() || !jParam[SZK_ID].isString() || !jParam[SZK_NS].isString()) {
+        return true;
+    }
+    const std::string strId = jParam[SZK_ID].asString();
+    const std::string strNs = jParam[SZK_NS].asString();
+    TESSEL_CHECK_APPEND(!TesselObjectIndexEx(pConn, strId.c_str(), strNs.c_str(), TesselObjectGetOwnerByID(strId)),
+                        "!TesselObjectIndexEx(pConn, szID, szNs, owner)", false);
+    return true;
+}
+
 }  // namespace
 
 DBConnect_tag *TesselOpenConn() {
@@ -227,4 +391,27 @@ pid_t TesselCheckVaccum() {
         _exit(0);
     }
     return pid;
+}
+
+bool TesselDeleteIndex(const Json::Value &jParam) {
+    DBConnect_tag *pConn = NULL;
+    TESSEL_CHECK_APPEND(NULL == (pConn = TesselOpenConn()), "NULL == (pConn = TesselOpenConn())", false);
+    TESSEL_CHECK_APPEND(!clear_index(pConn, jParam), "!clear_index(pConn, jParam)", false);
+    return true;
+}
+
+bool TesselReindex(const Json::Value &jParam) {
+    DBConnect_tag *pConn = NULL;
+    TESSEL_CHECK_APPEND(NULL == (pConn = TesselOpenConn()), "NULL == (pConn = TesselOpenConn())", false);
+    TESSEL_CHECK_APPEND(!clear_index(pConn, jParam), "!clear_index(pConn, jParam)", false);
+    if (jParam.isObject() && jParam.isMember(SZK_NS)) {
+        const std::string strNs = jParam[SZK_NS].asString();
+        std::string strNsPath;
+        TESSEL_CHECK_APPEND(!TesselGetNSPath(strNs, strNsPath), "!TesselGetNSPath(strNs, strNsPath)", false);
+        TESSEL_CHECK_APPEND(!ReindexNs(pConn, strNsPath, strNs), "!ReindexNs(pConn, strNsPath, strNs)", false);
+    } else {
+        TESSEL_CHECK_APPEND(!ReindexAll(pConn), "!ReindexAll(pConn)", false);
+    }
+    TESSEL_CHECK_APPEND(!TesselIndex(pConn, jParam), "!TesselIndex(pConn, jParam)", false);
+    return true;
 }
