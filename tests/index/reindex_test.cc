@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <syslog.h>
 
+#include <filesystem>
 #include <map>
 #include <memory>
 #include <string>
@@ -71,6 +72,11 @@ protected:
                          "FOR EACH STATEMENT EXECUTE FUNCTION log_insert();"));
     }
     void SetUp() override {
+        for (const std::string ns : {"ledger", "other"}) {
+            for (const auto &entry : std::filesystem::directory_iterator(std::string(kRepo) + "/" + ns)) {
+                std::filesystem::remove_all(entry.path());
+            }
+        }
         ASSERT_TRUE(Exec("TRUNCATE object, person, insert_log"));
         ErrClear();
     }
@@ -107,7 +113,7 @@ TEST_F(ReindexTest, DeletingOneNamespaceTakesItsPersonsAndEveryOrphanAndRewrites
 
     // A hostile name is a name like any other.
     ASSERT_TRUE(TesselDeleteIndex(Parse(R"({"ns": "x'); DELETE FROM object; --"})")));
-    EXPECT_EQ(Table({{"o1"}}), Rows("SELECT id FROM object UNION ALL SELECT id FROM person"));
+    EXPECT_EQ(Table({{"o1"}, {"o1"}}), Rows("SELECT id FROM object UNION ALL SELECT id FROM person"));
 
     // Parameters that name no scope are refused and delete nothing.
     Json::Value jNul(Json::objectValue);
@@ -143,10 +149,11 @@ TEST_F(ReindexTest, ReindexRebuildsWhatTheStoreHoldsInBatchesOfThirtyAndSkipsWha
         ledger.push_back(Create("ledger", n));
     }
     const std::string strOther = Create("other", 100);
-    // Entries that are no readable object: an empty directory with an
-    // object's name and a directory whose name holds no owner.
+    // Entries that are no readable object: an object directory whose
+    // "basic.json" is not JSON, and a directory whose name holds no owner.
     const std::string strEmpty = "1002_" + std::string(96, 'e');
     ASSERT_EQ(0, mkdir((std::string(kRepo) + "/other/" + strEmpty).c_str(), 0700));
+    ASSERT_TRUE(WriteFile(std::string(kRepo) + "/other/" + strEmpty + "/basic.json", "{not json"));
     ASSERT_EQ(0, mkdir((std::string(kRepo) + "/other/junk").c_str(), 0700));
     ASSERT_TRUE(Exec("INSERT INTO object (id, ns) VALUES ('stale', 'ledger'), ('kept', 'third');"
                      "INSERT INTO person (id, person) VALUES ('stale', '{}')"));
@@ -207,10 +214,12 @@ TEST_F(ReindexTest, IndexingByIdReadsTheStoredObject) {
               Rows("SELECT id, category, text, metatext FROM object"));
     EXPECT_EQ(Table({{strId}}), Rows("SELECT id FROM person"));
 
-    // The parameter's own object is indexed once more after the namespace.
+    // The parameter's own object is upserted once more after the namespace:
+    // its insert statements find the row there and add none.
     ASSERT_TRUE(Exec("TRUNCATE insert_log"));
     ASSERT_TRUE(TesselReindex(Parse("{\"ns\": \"ledger\", \"id\": \"" + strId + "\"}")));
-    EXPECT_EQ(Table({{"object", "1"}, {"person", "1"}}), Rows("SELECT tbl, nrows FROM insert_log ORDER BY seq"));
+    EXPECT_EQ(Table({{"object", "1"}, {"person", "1"}, {"object", "0"}, {"person", "0"}}),
+              Rows("SELECT tbl, nrows FROM insert_log ORDER BY seq"));
     EXPECT_EQ(Table({{strId, "c1"}}), Rows("SELECT id, category FROM object"));
 
     const std::string strMissing = "1001_" + std::string(96, '0');
