@@ -5,8 +5,10 @@
 //
 // Needs the sandbox's private server; build without sanitizers and run:
 //
-//   tests/sandbox/tessel-sandbox --pg --state build/sandbox --name tessel_index_bench \
+//   tests/sandbox/tessel-sandbox --pg --state build/sandbox --name tessel_index_bench
 //     --syslogd build/tests/sandbox/tessel-syslogd -- build/bench/tessel_index_bench
+//
+// (one command line).
 #include <stdio.h>
 #include <stdlib.h>
 
