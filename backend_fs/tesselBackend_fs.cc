@@ -4,6 +4,7 @@
 #include <string.h>
 #include <time.h>
 
+#include <git2/global.h>
 #include <quor/qlib.h>
 
 #include "backend_fs/meta.h"
@@ -38,6 +39,8 @@ const RegisterBackend g_registerFs("fs", CreateFsBackend);
 }  // namespace
 
 TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
+    // The version store assumes libgit2 is up while a backend exists.
+    git_libgit2_init();
     // The table is compiled in; a parse failure is a build defect, reported
     // here and seen as an empty table (no field read or saved) afterwards.
     if (!tessel::FsParseFieldTable(m_jFieldTable, m_fieldOrder)) {
@@ -46,7 +49,7 @@ TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
     }
 }
 
-TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() {}
+TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() { git_libgit2_shutdown(); }
 
 // ---- questions for the index store ------------------------------------------
 
