@@ -23,6 +23,8 @@
 #include "support/json_text.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
+#include <quor/qlib.h>
+
 #include "tessel_backend.h"
 #include "tessel_binary.h"
 #include "tessel_file.h"
@@ -451,6 +453,47 @@ TEST_F(MetaBinary, DownloadWritesTheGatewayResponse) {
     jParm.removeMember("segment");
     resp = Download(jParm);
     EXPECT_EQ((Msgs{"!jParm.isMember(\"segment\")"}), FrameMsgs(resp.stack));
+}
+
+}  // namespace
+
+namespace {
+
+// The web handlers' entry: the request from a string hash, checked before
+// anything is read.
+TEST(ObjectDownload, RequestsAreCheckedBeforeAnyRead) {
+    std::unique_ptr<QLIBSZHASH, void (*)(QLIBSZHASH *)> hash(QLIBCSzHashAlloc(16), QLIBCSzHashFree);
+    ASSERT_TRUE(hash);
+    const std::vector<std::pair<const char *, const char *>> keys = {
+        {"ns", "ledger"}, {"id", "1001_X"}, {"segment", "metabinary"}, {"field", "a"}, {"format", "raw"},
+        {"requester", "1001"}};
+    for (const auto &kv : keys) {
+        ErrClear();
+        EXPECT_FALSE(TesselObjectDownload(hash.get()));
+        EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode());
+        EXPECT_EQ(Msgs{std::string("NULL == (pParm = QLIBCSzHashGetValue(pParmHash, \"") + kv.first + "\"))"},
+                  ErrMsgs());
+        ASSERT_LE(0, QLIBCSzHashSetValue(hash.get(), kv.first, kv.second));
+    }
+    for (const std::pair<const char *, const char *> &bad :
+         std::vector<std::pair<const char *, const char *>>{{"", "!isdigit(pParm[0])"},
+                                                            {"-1", "!isdigit(pParm[0])"},
+                                                            {" 1", "!isdigit(pParm[0])"},
+                                                            {"1001x", "endPtr && *endPtr"},
+                                                            {"4294967296", "requester > UID_ERR"}}) {
+        ASSERT_LE(0, QLIBCSzHashSetValue(hash.get(), "requester", bad.first));
+        ErrClear();
+        EXPECT_FALSE(TesselObjectDownload(hash.get())) << bad.first;
+        EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode()) << bad.first;
+        EXPECT_EQ(Msgs{bad.second}, ErrMsgs()) << bad.first;
+    }
+
+    TESSEL_OBJECT object;
+    ErrClear();
+    EXPECT_FALSE(object.Download(Parse(R"({"ns": "ledger", "id": "1001_X", "segment": 7, "requester": 1001})")));
+    EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode());
+    EXPECT_EQ(Msgs{"!jParm[\"ns\"].isString() || !jParm[\"id\"].isString() || !jParm[\"segment\"].isString()"},
+              ErrMsgs());
 }
 
 }  // namespace
