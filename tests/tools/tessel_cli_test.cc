@@ -55,7 +55,7 @@ struct Result {
  * all its ids, the way a shell of that user would.
  */
 Result Tessel(const std::vector<std::string> &args, const std::string &stdinText = "", unsigned uid = 0,
-           unsigned gid = 0) {
+              unsigned gid = 0, const std::vector<std::string> &wrapper = {}) {
     tessel_test::ScratchDir dir;
     Result r;
     if (!dir.ok() || !WriteFile(dir.file("in"), stdinText) || 0 != chmod(dir.path().c_str(), 0777)) {
@@ -73,12 +73,16 @@ Result Tessel(const std::vector<std::string> &args, const std::string &stdinText
         if (0 != uid && (0 != setgroups(0, nullptr) || 0 != setresgid(gid, gid, gid) || 0 != setresuid(uid, uid, uid))) {
             _exit(126);
         }
-        std::vector<char *> argv{const_cast<char *>(TESSEL_CLI_PATH)};
-        for (const std::string &a : args) {
+        // A wrapper (a whole command line of its own) runs instead of the tool.
+        std::vector<char *> argv;
+        if (wrapper.empty()) {
+            argv.push_back(const_cast<char *>(TESSEL_CLI_PATH));
+        }
+        for (const std::string &a : wrapper.empty() ? args : wrapper) {
             argv.push_back(const_cast<char *>(a.c_str()));
         }
         argv.push_back(nullptr);
-        execv(TESSEL_CLI_PATH, argv.data());
+        execv(argv[0], argv.data());
         _exit(127);
     }
     int status = 0;
@@ -317,6 +321,46 @@ TEST_F(TesselCli, GetPassesParametersAndShowsTheLibrarysRefusals) {
     EXPECT_EQ(2, bob.code);
     EXPECT_EQ(0u, bob.err.find(ToolStack("\"requester\" names another user and the caller is not root",
                                          "ErrNo=[1007] (User input error.)")));
+}
+
+TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATerminal) {
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "--ns", "notes", "on"}).code);
+    Result nowhere = Tessel({"namespace", "create", "--ns", "notes"});
+    EXPECT_EQ(1, nowhere.code);
+    EXPECT_EQ("tessel call stack:\n"
+              "  !TesselFindNSPath(strNS, strPkgId, strNSPath) (common/tessel_common)\n"
+              "  strNSPath.empty() (common/tessel_common)\n",
+              nowhere.err);
+
+    // The package's target decides the volume.
+    ASSERT_EQ(0, system("mkdir -p /volume2/@appstore/NotesApp /var/packages/NotesApp && "
+                        "ln -sfn /volume2/@appstore/NotesApp /var/packages/NotesApp/target"));
+    Result placed = Tessel({"--compact", "namespace", "create", "--ns", "notes", "--pkg", "NotesApp"});
+    EXPECT_EQ(0, placed.code) << placed.err;
+    EXPECT_EQ("{\"ns\":\"notes\",\"path\":\"/volume2/@Tessel/notes\"}\n", placed.out);
+    Result path = Tessel({"--compact", "namespace", "path", "--ns", "notes"});
+    EXPECT_EQ(placed.out, path.out);
+    struct stat st;
+    ASSERT_EQ(0, stat("/volume2/@Tessel/notes", &st));
+    EXPECT_EQ(0700u, st.st_mode & 07777);
+
+    Result quiet = Tessel({"--compact", "reindex", "--ns", "notes"});
+    EXPECT_EQ(0, quiet.code) << quiet.err;
+    EXPECT_EQ("{\"indexed\":0,\"ns\":\"notes\",\"stored\":0}\n", quiet.out);
+    EXPECT_EQ("", quiet.err);
+
+    // On a terminal (a pseudo-terminal from script(1)) the bar is drawn on
+    // standard error, and its line ended before the result.
+    Result tty = Tessel({}, "", 0, 0, {"/usr/bin/script", "-qec", std::string(TESSEL_CLI_PATH) +
+                                                             " --compact reindex --ns notes", "/dev/null"});
+    EXPECT_EQ(0, tty.code);
+    EXPECT_EQ("\rreindex notes [" + std::string(40, '#') + "] 0/0\r\n{\"indexed\":0,\"ns\":\"notes\",\"stored\":0}\r\n",
+              tty.out.substr(tty.out.rfind("\rreindex notes [")));
+
+    Result empty = Tessel({"reindex", R"({"ns": ""})"});
+    EXPECT_EQ(2, empty.code);
+    EXPECT_EQ(0u, empty.err.find(ToolStack("\"ns\" must be a namespace name", "ErrNo=[1007] (User input error.)")));
 }
 
 }  // namespace

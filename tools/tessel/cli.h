@@ -65,6 +65,7 @@ struct Command {
 const std::vector<Command> &Commands();
 /* Appends the commands of one area to the table (called once per area). */
 void AddSettingsCommands(std::vector<Command> &table);
+void AddNamespaceCommands(std::vector<Command> &table);
 void AddGetCommands(std::vector<Command> &table);
 void AddCreateSetCommands(std::vector<Command> &table);
 void AddVersionCommands(std::vector<Command> &table);

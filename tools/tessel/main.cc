@@ -20,7 +20,9 @@ const std::vector<Command> &Commands() {
     static const std::vector<Command> table = [] {
         std::vector<Command> t;
         AddGetCommands(t);
+        AddNamespaceCommands(t);
         AddSettingsCommands(t);
+        AddReindexCommands(t);
         return t;
     }();
     return table;
