@@ -363,4 +363,33 @@ TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATermin
     EXPECT_EQ(0u, empty.err.find(ToolStack("\"ns\" must be a namespace name", "ErrNo=[1007] (User input error.)")));
 }
 
+TEST_F(TesselCli, VersionsAndDownloadShowTheLibrarysRefusalsAndWriteNothing) {
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
+    const std::string disabled = "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
+                                 "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
+                                 "  ErrNo=[1012] (Namespace is disabled.)\n";
+    Result list = Tessel({"--as", "alice", "versions", "list", "--ns", "other", "--id", "1001_X"});
+    EXPECT_EQ(1, list.code);
+    EXPECT_EQ("", list.out);
+    EXPECT_EQ("tessel call stack:\n"
+              "  0 > (count = TesselObjectVersionList(jParm, &pHead, total, listable_total)) (version/version_list)\n"
+              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (version/version_list)\n" + disabled,
+              list.err);
+    Result limit = Tessel({"versions", "list", "--ns", "other", "--id", "1001_X", "--limit", "ten"});
+    EXPECT_EQ(2, limit.code);
+    EXPECT_EQ(0u, limit.err.find(ToolStack("--limit needs a number: ten", "ErrNo=[1007] (User input error.)")));
+
+    tessel_test::ScratchDir dir;
+    ASSERT_TRUE(dir.ok());
+    Result download = Tessel({"--as", "alice", "download", "--ns", "other", "--id", "1001_X", "--name", "a.txt",
+                              "--output", dir.file("a.txt")});
+    EXPECT_EQ(1, download.code);
+    EXPECT_EQ("", download.out);
+    EXPECT_EQ("tessel call stack:\n"
+              "  !tmpObj.Get(jGetParm) (object/object_download)\n"
+              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n" + disabled,
+              download.err);
+    EXPECT_NE(0, access(dir.file("a.txt").c_str(), F_OK));
+}
+
 }  // namespace

@@ -23,6 +23,8 @@ const std::vector<Command> &Commands() {
         AddNamespaceCommands(t);
         AddSettingsCommands(t);
         AddReindexCommands(t);
+        AddVersionCommands(t);
+        AddDownloadCommands(t);
         return t;
     }();
     return table;
