@@ -182,9 +182,9 @@ BENCHMARK(BM_BatchIndex300)->Unit(benchmark::kMillisecond);
 bool StoreNamespace() {
     std::unique_ptr<TESSEL_BACKEND_OP> pFs(RegisterBackend::New("fs"));
     Json::Value jParm = Parse(R"({"ns": "bench", "owner": 1001, "requester": 1001, "category": "note",
-                                  "mtime": 1700000100, "metatext": {"color": "blue"}})");
+                                  "ctime": 1700000000, "acl": {"enabled": false}, "person": {"summary": {"count": 1}}})");
     std::unique_ptr<TESSEL_OBJECT, void (*)(TESSEL_OBJECT *)> obj(Record("x"), TesselObjectFreeList);
-    jParm["text"] = obj->get_text();
+    jParm["metatext"] = obj->get_text();
     std::string strId, strVer;
     if (!pFs->Create(jParm, strId, strVer)) {
         return false;
@@ -201,7 +201,8 @@ bool StoreNamespace() {
 }
 
 void BM_Reindex10000(benchmark::State &state) {
-    if (!Setup() || !StoreNamespace()) {
+    static const bool blStored = Setup() && StoreNamespace();
+    if (!blStored) {
         state.SkipWithError("could not lay out the namespace");
         return;
     }
@@ -214,7 +215,8 @@ void BM_Reindex10000(benchmark::State &state) {
     }
     state.SetItemsProcessed(state.iterations() * kReindexObjects);
 }
-BENCHMARK(BM_Reindex10000)->Unit(benchmark::kMillisecond)->Iterations(3);
+// Wall time: most of the work is the server's.
+BENCHMARK(BM_Reindex10000)->Unit(benchmark::kMillisecond)->Iterations(3)->UseRealTime();
 
 }  // namespace
 
