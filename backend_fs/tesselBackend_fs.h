@@ -17,6 +17,7 @@
 #include <vector>
 
 #include <json/value.h>
+#include <quor/qlib.h>
 
 #include "tessel_backend.h"
 
@@ -69,6 +70,19 @@ private:
     bool mf_SaveMetaBinary();
     bool mf_GetGit(TESSEL_OBJECT *pObject);
     bool mf_SaveGit(std::string &strNewVer);
+
+    /* The version side: an object's text and binaries in its own repository. */
+    bool TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLIBSZHASH *&pDelHash, const Json::Value &jParm,
+                                       const std::string &strDir);
+    bool mf_VersionDataFromDisk(const std::string &strDir, TESSEL_OBJECT *pObject);
+    /* strDir holds the requested version afterwards; remove it unless *pblIsLatest. */
+    bool mf_LoadGitVersion(std::string &strDir, bool *pblIsLatest, Json::Value &jCommitInfo);
+    bool mf_GetVersionGit(TESSEL_OBJECT_VERSION *pVersion);
+    int mf_ListVersionGit(TESSEL_OBJECT_VERSION **addrPHead);
+    bool mf_DiffVersionGit(Json::Value &jDiff);
+    bool mf_RenameGitField(std::string &strNewVer);
+    bool mf_DownloadVersionBinary();
+    bool mf_CountCommit(const Json::Value &jCommitMsg);
     bool mf_GetPerson(TESSEL_OBJECT *pObject);
     bool mf_SavePerson();
 
