@@ -65,21 +65,14 @@ protected:
     std::unique_ptr<TESSEL_BACKEND_OP> backend_{RegisterBackend::New("fs")};
 };
 
-// Until versioned fields are stored, a request that names one writes the
-// plain files and then fails, saying so.
-void ExpectVersionNotStored(bool blOk, const char *szOperationFrame) {
-    EXPECT_FALSE(blOk);
-    EXPECT_EQ(TESSEL_ERR_UNEXPECTED, ErrCode());
-    EXPECT_EQ((Msgs{"versioned fields are not stored yet", "!mf_SaveGit(strNewVer)", szOperationFrame}), ErrMsgs());
-}
-
 TEST_F(FsStore, CreateWritesTheObjectDirectoryAndItsFiles) {
     std::string strId, strVer;
-    ExpectVersionNotStored(backend_->Create(Req(R"("owner": 1001, "category": "note", "parent_id": "p1",
-                                                   "ctime": 100, "mtime": 100, "acl": {"enabled": true},
-                                                   "metatext": {"k": "v", "n": 2})"),
-                                            strId, strVer),
-                           "!mf_SaveConfig(strNewVer)");
+    // A modification time is a versioned field: the first version is made.
+    ASSERT_TRUE(backend_->Create(Req(R"("owner": 1001, "category": "note", "parent_id": "p1", "ctime": 100,
+                                        "mtime": 100, "acl": {"enabled": true}, "metatext": {"k": "v", "n": 2})"),
+                                 strId, strVer))
+        << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(40u, strVer.size());
     EXPECT_EQ(1001u, TesselObjectGetOwnerByID(strId));
     const std::string strBase = kNsDir + "/" + strId;
     EXPECT_EQ(Parse(
@@ -97,7 +90,7 @@ TEST_F(FsStore, CreateWritesTheObjectDirectoryAndItsFiles) {
         EXPECT_EQ(kUidAlice, st.st_uid) << szDir;
         EXPECT_EQ(kGidUsers, st.st_gid) << szDir;
     }
-    EXPECT_FALSE(fs::exists(strBase + "/git_info.json"));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 1, "listable_commit_cnt": 0})"), ReadJson(strBase + "/git_info.json"));
 
     // A given version is refused before anything is made.
     const size_t nEntries = std::distance(fs::directory_iterator(kNsDir), fs::directory_iterator());
@@ -214,7 +207,9 @@ TEST_F(FsStore, SetUpdatesInPlaceAndNeverLosesANewerValue) {
         jSet["mtime"] = (Json::Int64)mtime;
         jSet["metatext"] = Parse(strMetaText);
         ErrClear();
-        ExpectVersionNotStored(backend_->Set(jSet, strVer), "!mf_SaveConfig(strNewVer)");
+        // Nothing versioned changes: the given version stays the object's.
+        EXPECT_TRUE(backend_->Set(jSet, strVer)) << ::testing::PrintToString(ErrMsgs());
+        EXPECT_EQ(jSet["version"].asString(), strVer);
         return ReadJson(strBase + "/metatext.json");
     };
     const long long t0 = time(NULL) + 1000;  // newer than the create's entry "k"

@@ -1,0 +1,367 @@
+// The file-system store's versions through the backend registry: saves that
+// commit into each object's own repository (checked with the git tools),
+// version counters, reads of the latest and of older versions, histories,
+// differences and renames.
+#include <stdio.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <syslog.h>
+#include <time.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <memory>
+#include <set>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "backend_fs/utils.h"
+#include "support/error_stack.h"
+#include "support/json_text.h"
+#include "support/sandbox.h"
+#include "support/scratch.h"
+#include "tessel_backend.h"
+#include "tessel_file.h"
+#include "tesselobject.h"
+#include "tesselobjectversion.h"
+
+using namespace tessel_test;
+namespace fs = std::filesystem;
+
+namespace {
+
+const std::string kNsDir = "/volume1/@Tessel/ledger";
+const std::string kScratchDir = "/volume1/@tmp/@Tessel/ledger";
+const long long kT0 = 1700000000;
+using Msgs = std::vector<std::string>;
+
+// What a command printed on standard output, and its exit status.
+struct Run {
+    int status;
+    std::string out;
+};
+Run Shell(const std::string &strCmd) {
+    Run r{-1, ""};
+    FILE *p = popen(strCmd.c_str(), "r");
+    if (p == nullptr) {
+        return r;
+    }
+    char buf[4096];
+    size_t n;
+    while ((n = fread(buf, 1, sizeof(buf), p)) > 0) {
+        r.out.append(buf, n);
+    }
+    const int st = pclose(p);
+    r.status = WIFEXITED(st) ? WEXITSTATUS(st) : -1;
+    return r;
+}
+
+std::string Enc(const std::string &strName) {
+    std::string strOut;
+    EXPECT_TRUE(TesselEncode(strName, strOut));
+    return strOut;
+}
+
+class VersionStore : public ::testing::Test {
+protected:
+    void SetUp() override {
+        ASSERT_EQ(0, system(("mkdir -p " + kNsDir + " " + kScratchDir + " /usr/quor/etc/tessel/ns && ln -sfn " +
+                             kNsDir + " /usr/quor/etc/tessel/ns/ledger")
+                                .c_str()));
+        ASSERT_TRUE(scratch_.ok());
+        ASSERT_NE(nullptr, backend_);
+        ErrClear();
+    }
+
+    Json::Value Req(const std::string &strMembers) const {
+        Json::Value jParm = Parse("{" + strMembers + "}");
+        jParm["ns"] = "ledger";
+        if (!id_.empty() && !jParm.isMember("id")) {
+            jParm["id"] = id_;
+        }
+        return jParm;
+    }
+
+    // A new object of alice's; its first version.
+    std::string Create(const std::string &strMembers) {
+        std::string strVer;
+        id_.clear();
+        EXPECT_TRUE(backend_->Create(Req(R"("owner": 1001, "requester": 1001, "category": "note", )" + strMembers),
+                                     id_, strVer))
+            << ::testing::PrintToString(ErrMsgs());
+        return strVer;
+    }
+
+    std::string Set(const std::string &strMembers, unsigned requester = 1001) {
+        std::string strVer;
+        ErrClear();
+        EXPECT_TRUE(backend_->Set(Req(R"("requester": )" + std::to_string(requester) + ", " + strMembers), strVer))
+            << ::testing::PrintToString(ErrMsgs());
+        return strVer;
+    }
+
+    // The object's text and version as read with the given extra members.
+    Json::Value Read(const std::string &strMembers, bool blOk = true) {
+        TESSEL_OBJECT obj;
+        ErrClear();
+        const bool ok = backend_->Get(Req(R"("requester": 1001, )" + strMembers), &obj);
+        EXPECT_EQ(blOk, ok) << strMembers << ::testing::PrintToString(ErrMsgs());
+        Json::Value jRet(Json::objectValue);
+        jRet["text"] = obj.get_text();
+        jRet["version"] = obj.get_version();
+        jRet["commit_msg"] = obj.get_commit_msg();
+        jRet["mtime"] = (Json::Int64)obj.get_mtime();
+        return jRet;
+    }
+
+    std::string Base() const { return kNsDir + "/" + id_; }
+    std::string Repo() const { return Base() + "/version"; }
+    std::string Git(const std::string &strArgs) const { return Shell("git -C " + Repo() + " " + strArgs).out; }
+    // Work areas of this object left in the namespace scratch directory.
+    size_t WorkAreas() const {
+        size_t n = 0;
+        for (const auto &entry : fs::directory_iterator(kScratchDir)) {
+            n += entry.path().filename().string().rfind(id_ + ".", 0) == 0;
+        }
+        return n;
+    }
+
+    ScratchDir scratch_;
+    std::string id_;
+    std::unique_ptr<TESSEL_BACKEND_OP> backend_{RegisterBackend::New("fs")};
+};
+
+TEST_F(VersionStore, CreateCommitsTextAndBinariesIntoASoundRepository) {
+    ASSERT_TRUE(WriteFile(scratch_.file("upload"), "hello\n"));
+    const std::string strVer = Create(R"("mtime": 1700000000, "text": {"title": "Hello", "n": {"a": 1},
+        "memo": "12 apples"}, "raw_text": {"memo": true},
+        "binary_files": [{"name": "photo.jpg", "format": "raw", "path": ")" + scratch_.file("upload") + R"("}],
+        "commit_msg": {"listable": true, "note": "first"})");
+    ASSERT_EQ(40u, strVer.size());
+
+    EXPECT_EQ(0, Shell("git -C " + Repo() + " fsck --strict 2>&1").status) << Git("fsck --strict 2>&1");
+    EXPECT_EQ(strVer + "\nalice\nalice@example.com\n1700000000\n" +
+                  R"({"author_uid":1001,"commit_msg":{"listable":true,"note":"first"}})" + "\n",
+              Git("log --all --format=%H%n%an%n%ae%n%at%n%B"));
+    const std::set<std::string> files = {"text/" + Enc("title"), "text/" + Enc("n"), "text/" + Enc("memo"),
+                                         "binary/" + Enc("photo.jpg"), "binary_info/" + Enc("photo.jpg")};
+    std::set<std::string> tracked;
+    for (std::string strList = Git("ls-files"); !strList.empty();) {
+        const size_t nl = strList.find('\n');
+        tracked.insert(strList.substr(0, nl));
+        strList.erase(0, nl + 1);
+    }
+    EXPECT_EQ(files, tracked);
+    EXPECT_EQ("\"Hello\"", ReadFile(Repo() + "/text/" + Enc("title")));
+    EXPECT_EQ("{\"a\":1}", ReadFile(Repo() + "/text/" + Enc("n")));
+    EXPECT_EQ("12 apples", ReadFile(Repo() + "/text/" + Enc("memo")));
+    EXPECT_EQ("hello\n", ReadFile(Repo() + "/binary/" + Enc("photo.jpg")));
+    EXPECT_EQ(Parse(R"({"format": "raw", "md5": "b1946ac92492d2347c6235b4d2611184", "name": "photo.jpg",
+                        "auto_mtime": 1700000000})"),
+              ReadJson(Repo() + "/binary_info/" + Enc("photo.jpg")));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 1, "listable_commit_cnt": 1})"), ReadJson(Base() + "/git_info.json"));
+
+    // Read back: raw text as its bare string, the rest as JSON.
+    EXPECT_EQ(Parse(R"({"text": {"title": "Hello", "n": {"a": 1}, "memo": "12 apples"}, "version": ")" + strVer +
+                    R"(", "commit_msg": {"listable": true, "note": "first"}, "mtime": 1700000000})"),
+              Read(R"("field": {"text": true})"));
+}
+
+TEST_F(VersionStore, SetsOnTheLatestAndOnOlderVersions) {
+    const std::string v1 = Create(R"("mtime": 1700000000, "text": {"a": 1, "b": 2}, "commit_msg": "plain")");
+    EXPECT_EQ(Parse(R"({"commit_cnt": 1, "listable_commit_cnt": 0})"), ReadJson(Base() + "/git_info.json"));
+
+    // On the latest: a changed field and a removed one.
+    const std::string v2 = Set(R"("version": ")" + v1 + R"(", "mtime": 1700000010, "text": {"a": 10, "b": null},
+                                  "commit_msg": {"listable": true}, "metatext": {"k": "v"})");
+    ASSERT_EQ(40u, v2.size());
+    EXPECT_NE(v1, v2);
+    EXPECT_EQ("text/" + Enc("a") + "\n", Git("ls-files"));
+    EXPECT_EQ("10", ReadFile(Repo() + "/text/" + Enc("a")));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 2, "listable_commit_cnt": 1})"), ReadJson(Base() + "/git_info.json"));
+    EXPECT_EQ(0u, WorkAreas());
+
+    // Nothing versioned: the given version back, no commit, no count.
+    EXPECT_EQ(v1, Set(R"("version": ")" + v1 + R"(", "mtime": 1700000015, "metatext": {"k": "w"})"));
+    EXPECT_EQ("2\n", Git("rev-list --all --count"));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 2, "listable_commit_cnt": 1})"), ReadJson(Base() + "/git_info.json"));
+
+    // On the older version: a branch of its own, and the newest becomes the latest.
+    const std::string v3 = Set(R"("version": ")" + v1 + R"(", "mtime": 1700000020, "text": {"c": 3})");
+    const std::string strHeads = Git("for-each-ref refs/heads");
+    EXPECT_EQ(2, std::count(strHeads.begin(), strHeads.end(), '\n')) << strHeads;
+    EXPECT_EQ(v1 + "\n", Git("log -1 --format=%P " + v3));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 3, "listable_commit_cnt": 1})"), ReadJson(Base() + "/git_info.json"));
+    EXPECT_EQ(Parse(R"({"text": {"a": 1, "b": 2, "c": 3}, "version": ")" + v3 +
+                    R"(", "commit_msg": null, "mtime": 1700000020})"),
+              Read(R"("field": {"text": true})"));
+
+    // An older version is checked out into the work area, which then goes.
+    // A file where the work area would be made shows which reads need one.
+    const std::string strWorkArea = kScratchDir + "/" + id_ + "." + tessel::FsScratchName();
+    ASSERT_TRUE(WriteFile(strWorkArea, "in the way"));
+    EXPECT_EQ(v3, Read(R"("version": ")" + v3 + R"(", "field": {"text": true})")["version"].asString());
+    Read(R"("version": ")" + v2 + R"(", "field": {"text": true})", false);
+    EXPECT_EQ(TESSEL_ERR_MKDIR, ErrCode());
+    EXPECT_EQ((Msgs{"!TesselRootFSMkdirP(strTmpDir.c_str(), UID_ERR)", "!mf_LoadGitVersion(strDir, &blIsLatest)",
+                    "!mf_GetGit(pObject)"}),
+              ErrMsgs());
+    EXPECT_EQ("in the way", ReadFile(strWorkArea));
+    ASSERT_TRUE(fs::remove(strWorkArea));
+    EXPECT_EQ(Parse(R"({"text": {"a": 10}, "version": ")" + v2 +
+                    R"(", "commit_msg": {"listable": true}, "mtime": 1700000010})"),
+              Read(R"("version": ")" + v2 + R"(", "field": {"text": true})"));
+    EXPECT_EQ(0u, WorkAreas());
+
+    // A version that does not exist.
+    Read(R"("version": "0123456789012345678901234567890123456789", "field": {"text": true})", false);
+    EXPECT_EQ(TESSEL_ERR_NOT_EXISTS, ErrCode());
+    ASSERT_LE(2u, ErrMsgs().size());
+    EXPECT_EQ((Msgs{"!mf_LoadGitVersion(strDir, &blIsLatest)", "!mf_GetGit(pObject)"}),
+              Msgs(ErrMsgs().end() - 2, ErrMsgs().end()));
+    EXPECT_EQ(0u, WorkAreas());
+}
+
+TEST_F(VersionStore, ReadsWhatTheSelectionAndTheFilterLeave) {
+    const std::string v1 = Create(R"("mtime": 1700000000, "text": {"a": 1, "b": "two", "tmp_x": 3, "tmp": 4})");
+    const Json::Value jFilter = Parse(R"({"text": {"key": ["b"], "prefix": ["tmp_"]}})");
+    TESSEL_OBJECT obj;
+    Json::Value jParm = Req(R"("requester": 1001, "field": {"text": true})");
+    jParm["field_filter"] = jFilter;
+    ASSERT_TRUE(backend_->Get(jParm, &obj)) << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(Parse(R"({"a": 1, "tmp": 4})"), obj.get_text());
+
+    EXPECT_EQ(Parse(R"({"a": 1, "b": "two"})"),
+              Read(R"("field": {"text": {"a": true, "b": {"x": true}, "tmp": false, "gone": true}})")["text"]);
+    // Without a text selection the text is not read; version and time are.
+    EXPECT_EQ(Parse(R"({"text": null, "version": ")" + v1 + R"(", "commit_msg": null, "mtime": 1700000000})"),
+              Read(R"("field": {"text": {"a": false}})"));
+}
+
+TEST_F(VersionStore, ListsDiffsAndRenames) {
+    const std::string v1 = Create(R"("mtime": 1700000000, "text": {"a": 1, "b": 2}, "commit_msg": {"listable": true})");
+    // Only the owner may name another author in the message.
+    const std::string v2 = Set(R"("version": ")" + v1 + R"(", "mtime": 1700000010, "text": {"a": 5, "b": null, "c": 7},
+                                  "commit_msg": {"k": 2, "author_uid": 1007})",
+                               kUidBob);
+    const std::string v3 = Set(R"("version": ")" + v2 + R"(", "mtime": 1700000020, "text": {"c": 8},
+                                  "commit_msg": {"listable": true, "k": 3, "author_uid": 1007})");
+
+    auto list = [&](const std::string &strMembers, unsigned &total, unsigned &listable) {
+        TESSEL_OBJECT_VERSION *pHead = nullptr;
+        ErrClear();
+        const int count = backend_->VersionList(Req(strMembers), &pHead, total, listable);
+        EXPECT_LE(0, count) << ::testing::PrintToString(ErrMsgs());
+        Json::Value jOut(Json::arrayValue);
+        for (TESSEL_OBJECT_VERSION *p = pHead; p != nullptr; p = p->next) {
+            Json::Value jVer(Json::objectValue);
+            jVer["version"] = p->get_version();
+            jVer["author"] = (Json::UInt64)p->get_author();
+            jVer["mtime"] = (Json::Int64)p->get_mtime();
+            jVer["commit_msg"] = p->get_commit_msg();
+            jVer["last_version"] = p->get_last_version();
+            jVer["ns"] = p->get_ns();
+            jVer["id"] = p->get_id();
+            jOut.append(jVer);
+        }
+        EXPECT_EQ((int)jOut.size(), count);
+        TesselObjectVersionFreeList(pHead);
+        return jOut;
+    };
+    auto record = [&](const std::string &v, unsigned author, long long mtime, const std::string &strMsg,
+                      const std::string &strParents) {
+        return Parse(R"({"version": ")" + v + R"(", "author": )" + std::to_string(author) + R"(, "mtime": )" +
+                     std::to_string(mtime) + R"(, "commit_msg": )" + strMsg + R"(, "last_version": )" + strParents +
+                     R"(, "ns": "ledger", "id": ")" + id_ + R"("})");
+    };
+    const Json::Value r1 = record(v1, 1001, kT0, R"({"listable": true})", "[]");
+    const Json::Value r2 = record(v2, kUidBob, kT0 + 10, R"({"k": 2, "author_uid": 1007})", "[\"" + v1 + "\"]");
+    const Json::Value r3 =
+        record(v3, kUidGrace, kT0 + 20, R"({"listable": true, "k": 3, "author_uid": 1007})", "[\"" + v2 + "\"]");
+    unsigned total = 0, listable = 0;
+    Json::Value jExpected(Json::arrayValue);
+    for (const Json::Value *r : {&r3, &r2, &r1}) jExpected.append(*r);
+    EXPECT_EQ(jExpected, list("", total, listable));
+    EXPECT_EQ(3u, total);
+    EXPECT_EQ(2u, listable);
+    jExpected = Json::Value(Json::arrayValue);
+    for (const Json::Value *r : {&r1, &r2, &r3}) jExpected.append(*r);
+    EXPECT_EQ(jExpected, list(R"("sort_direction": "asc")", total, listable));
+    jExpected = Json::Value(Json::arrayValue);
+    jExpected.append(r2);
+    EXPECT_EQ(jExpected, list(R"("limit": 1, "offset": 1, "sort_direction": "desc")", total, listable));
+    jExpected = Json::Value(Json::arrayValue);
+    for (const Json::Value *r : {&r1, &r3}) jExpected.append(*r);
+    EXPECT_EQ(jExpected, list(R"("filter": {"listable": true}, "sort_direction": "Asc")", total, listable));
+
+    // One version; "ver" names it, the latest when absent.
+    TESSEL_OBJECT_VERSION ver;
+    ASSERT_TRUE(backend_->VersionGet(Req(R"("ver": ")" + v2 + R"(")"), &ver)) << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(v2, ver.get_version());
+    EXPECT_EQ(kUidBob, ver.get_author());
+    EXPECT_EQ(Parse("[\"" + v1 + "\"]"), ver.get_last_version());
+    ASSERT_TRUE(backend_->VersionGet(Req(""), &ver));
+    EXPECT_EQ(v3, ver.get_version());
+
+    // Differences: files of text and binaries only, by their names.
+    Json::Value jDiff(Json::objectValue);
+    ASSERT_TRUE(backend_->VersionDiff(Req(R"("old_version": ")" + v1 + R"(")"), jDiff))
+        << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(Parse(R"({"text": {"a": "modified", "b": "deleted", "c": "created"}})"), jDiff);
+
+    // A rename is a commit of its own, by the requester.
+    std::string v4;
+    ASSERT_TRUE(backend_->FieldRename(Req(R"("requester": 1001, "version": ")" + v3 + R"(", "segment": "text",
+                                              "old_field": "c", "new_field": "see", "mtime": 1700000030)"),
+                                      v4))
+        << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(Parse(R"({"a": 5, "see": 8})"), Read(R"("field": {"text": true})")["text"]);
+    jDiff = Json::Value(Json::objectValue);
+    ASSERT_TRUE(backend_->VersionDiff(Req(R"("old_version": ")" + v3 + R"(", "new_version": ")" + v4 + R"(")"), jDiff));
+    EXPECT_EQ(Parse(R"({"text": {"c": "deleted", "see": "created"}})"), jDiff);
+    EXPECT_EQ("alice\n" + v3 + "\n", Git("log -1 --format=%an%n%P " + v4));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 4, "listable_commit_cnt": 2})"), ReadJson(Base() + "/git_info.json"));
+
+    ErrClear();
+    EXPECT_FALSE(backend_->FieldRename(Req(R"("version": ")" + v4 + R"(", "segment": "meta", "old_field": "a",
+                                              "new_field": "b")"),
+                                       v4));
+    EXPECT_EQ(TESSEL_ERR_BAD_PARAMETERS, ErrCode());
+    EXPECT_EQ((Msgs{"segment error, segment=\"meta\"", "!mf_RenameGitField(strNewVer)"}), ErrMsgs());
+}
+
+TEST_F(VersionStore, BinariesComeAndGoWithTheirDescriptions) {
+    ASSERT_TRUE(WriteFile(scratch_.file("one"), "one"));
+    const std::string v1 = Create(R"("mtime": 1700000000, "text": {},
+        "binary_files": [{"name": "a.bin", "format": "raw", "path": ")" + scratch_.file("one") + R"("},
+                         {"name": "b.bin", "format": "base64", "path": ")" + scratch_.file("one") + R"("}])");
+    const std::string v2 = Set(R"("version": ")" + v1 + R"(", "mtime": 1700000010,
+        "binary_files": [{"name": "a.bin", "format": "delete"}])");
+    EXPECT_EQ("binary/" + Enc("b.bin") + "\nbinary_info/" + Enc("b.bin") + "\n", Git("ls-files"));
+    EXPECT_FALSE(fs::exists(Repo() + "/binary/" + Enc("a.bin")));
+    EXPECT_FALSE(fs::exists(Repo() + "/binary_info/" + Enc("a.bin")));
+    Json::Value jDiff(Json::objectValue);
+    ASSERT_TRUE(backend_->VersionDiff(Req(R"("old_version": ")" + v1 + R"(")"), jDiff));
+    EXPECT_EQ(Parse(R"({"binary": {"a.bin": "deleted"}})"), jDiff);
+
+    // A failed save commits nothing, counts nothing and leaves no work area.
+    std::string strVer;
+    ErrClear();
+    EXPECT_FALSE(backend_->Set(Req(R"("requester": 1001, "version": ")" + v2 + R"(", "text": {"x": 1},
+        "binary_files": [{"name": "c.bin", "format": "raw", "path": ")" + scratch_.file("missing") + R"("}])"),
+                               strVer));
+    EXPECT_EQ(TESSEL_ERR_OPEN_FILE, ErrCode());
+    const Msgs msgs = ErrMsgs();
+    ASSERT_LE(3u, msgs.size());
+    EXPECT_EQ((Msgs{"!TesselObjectEvalFileMd5(strFile.c_str(), strMd5)",
+                    "!TesselObjectVersionDataToDisk(pAddHash, pDelHash, m_jParm, strTmpDir)", "!mf_SaveGit(strNewVer)",
+                    "!mf_SaveConfig(strNewVer)"}),
+              Msgs(msgs.end() - 4, msgs.end()));
+    EXPECT_EQ("2\n", Git("rev-list --all --count"));
+    EXPECT_EQ(Parse(R"({"commit_cnt": 2, "listable_commit_cnt": 0})"), ReadJson(Base() + "/git_info.json"));
+    EXPECT_EQ(0u, WorkAreas());
+}
+
+}  // namespace
