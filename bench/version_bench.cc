@@ -36,6 +36,11 @@ const long long kT0 = 1700000000;
 
 using Fields = std::vector<std::pair<std::string, std::string>>;
 
+// The framework runs each benchmark several times; names made from this stay
+// unique over all the runs of the program.
+long g_serial = 0;
+std::string Fresh(const std::string &strPrefix) { return kWorkDir + "/" + strPrefix + std::to_string(++g_serial); }
+
 Json::Value Parse(const std::string &strText) {
     Json::Value jVal;
     tessel::fromString(jVal, strText);
@@ -212,7 +217,8 @@ void BM_GitLayerCreate(benchmark::State &state) {
     QLIBSZHASH *pDel = QLIBCSzHashAlloc(16);
     long n = 0;
     for (auto _ : state) {
-        const std::string strRepo = kWorkDir + "/layer-" + std::to_string(++n);
+        ++n;
+        const std::string strRepo = Fresh("layer-");
         QLIBSZHASH *pAdd = StageFields(strRepo, ThreeFields(n));
         std::string strVer;
         const int rc = GitCreateRepository(strRepo.c_str(), kT0 + n, pAdd, pDel, "alice", "alice@example.com",
@@ -228,8 +234,8 @@ void BM_GitLayerCreate(benchmark::State &state) {
 BENCHMARK(BM_GitLayerCreate);
 
 void BM_GitLayerCommit(benchmark::State &state) {
-    const std::string strRepo = kWorkDir + "/layer-commit";
-    const std::string strStage = kWorkDir + "/layer-commit-stage";
+    const std::string strRepo = Fresh("layer-commit-");
+    const std::string strStage = strRepo + "-stage";
     QLIBSZHASH *pDel = QLIBCSzHashAlloc(16);
     QLIBSZHASH *pAdd = StageFields(strRepo, ThreeFields(0));
     std::string strVer;
@@ -262,7 +268,8 @@ BENCHMARK(BM_GitLayerCommit);
 void BM_BaselineCreate(benchmark::State &state) {
     long n = 0;
     for (auto _ : state) {
-        const std::string strObject = kWorkDir + "/plain-" + std::to_string(++n);
+        ++n;
+        const std::string strObject = Fresh("plain-");
         if (mkdir(strObject.c_str(), 0700) != 0 ||
             !tessel_bench::BaselineCreate(strObject + "/version", ThreeFields(n), kT0 + n)) {
             state.SkipWithError("baseline create failed");
@@ -273,7 +280,7 @@ void BM_BaselineCreate(benchmark::State &state) {
 BENCHMARK(BM_BaselineCreate);
 
 void BM_BaselineCommit(benchmark::State &state) {
-    const std::string strObject = kWorkDir + "/plain-commit";
+    const std::string strObject = Fresh("plain-commit-");
     if (mkdir(strObject.c_str(), 0700) != 0 ||
         !tessel_bench::BaselineCreate(strObject + "/version", ThreeFields(0), kT0)) {
         state.SkipWithError("setup failed");
