@@ -453,9 +453,8 @@ bool TESSEL_BACKEND_FS::Download(const Json::Value &jParm) {
     TESSEL_CHECK_APPEND(!mf_init(jParm), "!mf_init(jParm)", false);
     const std::string strSegment = jParm["segment"].isString() ? jParm["segment"].asString() : std::string();
     if (SZ_SEGMENT_BINARY == strSegment) {
-        // ---- versioned binaries: the version store answers here ----
-        TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "versioned binaries are not downloadable yet");
-        return false;
+        TESSEL_CHECK_APPEND(!mf_DownloadVersionBinary(), "!mf_DownloadVersionBinary()", false);
+        return true;
     }
     if (SZ_SEGMENT_METABINARY == strSegment) {
         TESSEL_CHECK_APPEND(!mf_DownloadMetaBinary(), "!mf_DownloadMetaBinary()", false);

@@ -3,7 +3,7 @@
 // its path information); every save that changes them is a commit, and older
 // versions are read back by checking them out into the request's work area.
 #include <ftw.h>
-#include <glob.h>
+#include <dirent.h>
 #include <string.h>
 #include <sys/stat.h>
 #include <time.h>
@@ -180,8 +180,27 @@ bool TESSEL_BACKEND_FS::TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLI
             const std::string strBinKey = TESSEL_GIT_BIN "/" + strNameEncode;
             const std::string strInfoKey = TESSEL_GIT_BIN_INFO "/" + strNameEncode;
             if (strFormat == "object") {
-                TESSEL_RAISE(TESSEL_ERR_UNEXPECTED, "binaries of other objects are not copied into versions yet");
-                return false;
+                // A stored binary of another object: its latest file and
+                // description go into this version as they are.
+                Json::Value jPathInfoTmp;
+                TESSEL_CHECK_APPEND(!mf_GetBinaryObjectPath(jArray[i], jPathInfoTmp),
+                                    "!mf_GetBinaryObjectPath(jArray[i], jPathInfoTmp)", false);
+                const std::string strSrcFile = jPathInfoTmp[TESSEL_BIN_PATH].asString() + "/" + strNameEncode;
+                const std::string strSrcInfo = jPathInfoTmp[TESSEL_BIN_INFO_PATH].asString() + "/" + strNameEncode;
+                TESSEL_CHECK(!QLIBCFileExist(strSrcFile.c_str()), TESSEL_ERR_NOT_EXISTS,
+                             "!QLIBCFileExist(strSrcFile.c_str())", false);
+                TESSEL_CHECK(!QLIBCFileExist(strSrcInfo.c_str()), TESSEL_ERR_NOT_EXISTS,
+                             "!QLIBCFileExist(strSrcInfo.c_str())", false);
+                Json::Value jSrcInfo;
+                TESSEL_CHECK(!tessel::fromFile(jSrcInfo, strSrcInfo) || !jSrcInfo.isObject() ||
+                                 !jSrcInfo.isMember("md5"),
+                             TESSEL_ERR_READ_FILE,
+                             "!jSrcInfo.fromFile(strSrcInfo) || !jSrcInfo.isObject() || !jSrcInfo.isMember(\"md5\")",
+                             false);
+                TESSEL_CHECK(0 != QLIBCSzHashSetValue(pAddHash, strBinKey.c_str(), strSrcFile.c_str()) ||
+                                 0 != QLIBCSzHashSetValue(pAddHash, strInfoKey.c_str(), strSrcInfo.c_str()),
+                             TESSEL_ERR_OUT_OF_MEMORY, "0 != QLIBCSzHashSetValue(pAddHash, ...)", false);
+                continue;
             }
             if (strFormat == SZ_DELETE) {
                 TESSEL_CHECK(0 != QLIBCSzHashSetValue(pDelHash, strBinKey.c_str(), SZ_DELETE) ||
@@ -397,13 +416,12 @@ bool TESSEL_BACKEND_FS::mf_VersionDataFromDisk(const std::string &strDir, TESSEL
         return true;
     }
     const Json::Value &jParm = m_jParm;
+    static const Json::Value jNull;
     const Json::Value &jField = jParm["field"];
-    if (!jField.isObject() || !jField.isMember("text")) {
-        return true;
-    }
-    const Json::Value &jSelect = jField["text"];
+    const Json::Value &jSelect = jField.isObject() ? jField["text"] : jNull;
     const Json::Value &jRaw = jParm["raw_text"];
-    const Json::Value &jFilter = jParm["field_filter"]["text"];
+    const Json::Value &jFilter = jParm["field_filter"].isObject() ? jParm["field_filter"]["text"] : jNull;
+    const bool blAll = jSelect.isBool() && jSelect.asBool();
     const std::string strTextDir = strDir + "/" TESSEL_GIT_TEXT;
     Json::Value jText(Json::objectValue);
     // One stored field into jText; a field whose file is missing is absent.
@@ -422,29 +440,23 @@ bool TESSEL_BACKEND_FS::mf_VersionDataFromDisk(const std::string &strDir, TESSEL
         return true;
     };
     TESSEL_AS_ROOT();
-    if (jSelect.isBool() && jSelect.asBool()) {
-        const std::string strPattern = strTextDir + "/*";
-        glob_t globbuf;
-        memset(&globbuf, 0, sizeof(globbuf));
-        const int rv = glob(strPattern.c_str(), 0, NULL, &globbuf);
-        if (0 != rv && GLOB_NOMATCH != rv) {
-            TESSEL_LOG(LOG_ERR, "glob fail, path=%s, rv=%d\n", strPattern.c_str(), rv);
-        }
-        bool blOk = true;
-        for (size_t i = 0; blOk && i < globbuf.gl_pathc; ++i) {
-            const std::string strFile = globbuf.gl_pathv[i];
-            std::string strNameEncode = strFile.substr(strFile.rfind('/') + 1);
-            std::string strName;
-            if (!TesselDecode(strNameEncode, strName)) {
-                TESSEL_APPEND("!TesselDecode(strNameEncode, strName)");
-                blOk = false;
-            } else if (!FilteredOut(jFilter, strName)) {
-                blOk = readField(strName, strFile);
+    if (blAll) {
+        // Every field of the version: the names in its text folder (a folder
+        // that is not there holds none).
+        std::unique_ptr<DIR, int (*)(DIR *)> dir(opendir(strTextDir.c_str()), closedir);
+        std::vector<std::string> encodedNames;
+        for (struct dirent *pEntry = dir ? readdir(dir.get()) : NULL; NULL != pEntry; pEntry = readdir(dir.get())) {
+            // An encoded name has no '.': anything else is not a field's file.
+            if (NULL == strchr(pEntry->d_name, '.')) {
+                encodedNames.push_back(pEntry->d_name);
             }
         }
-        globfree(&globbuf);
-        if (!blOk) {
-            return false;
+        for (std::string &strNameEncode : encodedNames) {
+            std::string strName;
+            TESSEL_CHECK_APPEND(!TesselDecode(strNameEncode, strName), "!TesselDecode(strNameEncode, strName)", false);
+            if (!FilteredOut(jFilter, strName) && !readField(strName, strTextDir + "/" + strNameEncode)) {
+                return false;
+            }
         }
     } else if (jSelect.isObject()) {
         for (Json::Value::const_iterator it = jSelect.begin(); it != jSelect.end(); ++it) {
@@ -460,7 +472,33 @@ bool TESSEL_BACKEND_FS::mf_VersionDataFromDisk(const std::string &strDir, TESSEL
             }
         }
     }
-    pObject->swap_text(jText);
+    // Without a text selection the record's text stays as it is.
+    if (blAll || jSelect.isObject()) {
+        pObject->swap_text(jText);
+    }
+    Json::Value jInfo;
+    TESSEL_CHECK_APPEND(!mf_GetBinaryInfoByDir(strDir + "/" TESSEL_GIT_BIN_INFO, jInfo, "binary_info"),
+                        "!mf_GetBinaryInfoByDir(strDir + \"/binary_info\", jInfo, \"binary_info\")", false);
+    pObject->swap_binary_info(jInfo["binary_info"]);
+    return true;
+}
+
+bool TESSEL_BACKEND_FS::mf_DownloadVersionBinary() {
+    std::string strDir;
+    bool blIsLatest = true;
+    Json::Value jCommitInfo;
+    TESSEL_CHECK_APPEND(!mf_LoadGitVersion(strDir, &blIsLatest, jCommitInfo),
+                        "!mf_LoadGitVersion(strDir, &blIsLatest)", false);
+    WorkAreaRemover remover;
+    if (!blIsLatest) {
+        remover.Arm(strDir);
+    }
+    Json::Value jPathInfo(Json::objectValue);
+    TESSEL_CHECK_APPEND(!mf_GetPathInfoByGitBase(strDir, jPathInfo), "!mf_GetPathInfoByGitBase(strDir, jPathInfo)",
+                        false);
+    TESSEL_CHECK_APPEND(
+        !mf_DownloadBinaryByDir(jPathInfo[TESSEL_GIT_BIN].asString(), jPathInfo[TESSEL_GIT_BIN_INFO].asString()),
+        "!mf_DownloadBinaryByDir(strBinaryDir, strBinaryInfoDir)", false);
     return true;
 }
 

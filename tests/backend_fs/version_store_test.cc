@@ -2,17 +2,21 @@
 // commit into each object's own repository (checked with the git tools),
 // version counters, reads of the latest and of older versions, histories,
 // differences and renames.
+#include <fcntl.h>
 #include <stdio.h>
+#include <stdlib.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <syslog.h>
 #include <time.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
 #include <memory>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -340,29 +344,96 @@ TEST_F(VersionStore, ListsDiffsAndRenames) {
     EXPECT_EQ((Msgs{"segment error, segment=\"meta\"", "!mf_RenameGitField(strNewVer)"}), ErrMsgs());
 }
 
+// Downloads the request's binary in a child whose standard output goes to a
+// file: the response, and the child's error frames when it failed.
+std::pair<std::string, Msgs> Download(const Json::Value &jParm) {
+    ScratchDir dir;
+    const std::string strOut = dir.file("stdout");
+    const std::string strStack = dir.file("stack");
+    const int rc = RunInChild([&]() {
+        unsetenv("HTTP_IF_NONE_MATCH");
+        unsetenv("HTTP_USER_AGENT");
+        fflush(stdout);
+        const int fd = open(strOut.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+        if (fd < 0 || dup2(fd, STDOUT_FILENO) < 0) {
+            return 99;
+        }
+        ErrClear();
+        std::unique_ptr<TESSEL_BACKEND_OP> backend(RegisterBackend::New("fs"));
+        const bool ok = backend->Download(jParm);
+        fflush(stdout);
+        std::string strMsgs;
+        for (const std::string &strMsg : ErrMsgs()) {
+            strMsgs += strMsg + "\n";
+        }
+        return WriteFile(strStack, strMsgs) ? (ok ? 0 : 1) : 98;
+    });
+    EXPECT_TRUE(0 == rc || 1 == rc) << rc;
+    Msgs msgs;
+    std::string strMsgs = ReadFile(strStack);
+    for (size_t nl; (nl = strMsgs.find('\n')) != std::string::npos; strMsgs.erase(0, nl + 1)) {
+        msgs.push_back(strMsgs.substr(0, nl));
+    }
+    return {ReadFile(strOut), msgs};
+}
+
 TEST_F(VersionStore, BinariesComeAndGoWithTheirDescriptions) {
     ASSERT_TRUE(WriteFile(scratch_.file("one"), "one"));
+    Create(R"("mtime": 1699999999, "text": {},
+        "binary_files": [{"name": "c.txt", "format": "raw", "path": ")" + scratch_.file("one") + R"("}])");
+    const std::string strOther = id_;
     const std::string v1 = Create(R"("mtime": 1700000000, "text": {},
-        "binary_files": [{"name": "a.bin", "format": "raw", "path": ")" + scratch_.file("one") + R"("},
-                         {"name": "b.bin", "format": "base64", "path": ")" + scratch_.file("one") + R"("}])");
+        "binary_files": [{"name": "a.txt", "format": "raw", "path": ")" + scratch_.file("one") + R"("},
+                         {"name": "b.txt", "format": "base64", "path": ")" + scratch_.file("one") + R"("},
+                         {"name": "c.txt", "format": "object", "id": ")" + strOther + R"("}])");
+    // Another object's binary comes with its own description.
+    for (const char *szFolder : {"/binary/", "/binary_info/"}) {
+        EXPECT_EQ(ReadFile(kNsDir + "/" + strOther + "/version" + szFolder + Enc("c.txt")),
+                  ReadFile(Repo() + szFolder + Enc("c.txt")));
+    }
     const std::string v2 = Set(R"("version": ")" + v1 + R"(", "mtime": 1700000010,
-        "binary_files": [{"name": "a.bin", "format": "delete"}])");
-    EXPECT_EQ("binary/" + Enc("b.bin") + "\nbinary_info/" + Enc("b.bin") + "\n", Git("ls-files"));
-    EXPECT_FALSE(fs::exists(Repo() + "/binary/" + Enc("a.bin")));
-    EXPECT_FALSE(fs::exists(Repo() + "/binary_info/" + Enc("a.bin")));
+        "binary_files": [{"name": "a.txt", "format": "delete"}])");
+    EXPECT_EQ("binary/" + Enc("b.txt") + "\nbinary/" + Enc("c.txt") + "\nbinary_info/" + Enc("b.txt") +
+                  "\nbinary_info/" + Enc("c.txt") + "\n",
+              Git("ls-files"));
+    EXPECT_FALSE(fs::exists(Repo() + "/binary/" + Enc("a.txt")));
+    EXPECT_FALSE(fs::exists(Repo() + "/binary_info/" + Enc("a.txt")));
     Json::Value jDiff(Json::objectValue);
     ASSERT_TRUE(backend_->VersionDiff(Req(R"("old_version": ")" + v1 + R"(")"), jDiff));
-    EXPECT_EQ(Parse(R"({"binary": {"a.bin": "deleted"}})"), jDiff);
+    EXPECT_EQ(Parse(R"({"binary": {"a.txt": "deleted"}})"), jDiff);
+
+    // The descriptions of the version read come with every read.
+    TESSEL_OBJECT obj;
+    ASSERT_TRUE(backend_->Get(Req(R"("requester": 1001, "version": ")" + v1 + R"(")"), &obj));
+    EXPECT_EQ(Parse(R"({"a.txt": {"format": "raw", "md5": "f97c5d29941bfb1b2fdab0874906ab82", "name": "a.txt",
+                                  "auto_mtime": 1700000000},
+                        "b.txt": {"format": "base64", "md5": "f97c5d29941bfb1b2fdab0874906ab82", "name": "b.txt",
+                                  "auto_mtime": 1700000000},
+                        "c.txt": {"format": "raw", "md5": "f97c5d29941bfb1b2fdab0874906ab82", "name": "c.txt",
+                                  "auto_mtime": 1699999999}})"),
+              obj.get_binary_info());
+
+    // A file of an older version is sent from a checkout, which then goes.
+    Json::Value jParm = Req(R"("requester": 1001, "segment": "binary", "field": "a.txt", "format": "raw")");
+    jParm["version"] = v1;
+    EXPECT_EQ((std::pair<std::string, Msgs>{"Content-Type: text/plain\r\nContent-Length: 3\r\n\r\none", {}}),
+              Download(jParm));
+    EXPECT_EQ(0u, WorkAreas());
+    jParm.removeMember("version");
+    EXPECT_EQ((std::pair<std::string, Msgs>{"", {"!QLIBCFileExist(strBinaryFilePath.c_str())",
+                                                 "!mf_DownloadBinaryByDir(strBinaryDir, strBinaryInfoDir)",
+                                                 "!mf_DownloadVersionBinary()"}}),
+              Download(jParm));
 
     // A failed save commits nothing, counts nothing and leaves no work area.
     std::string strVer;
     ErrClear();
     EXPECT_FALSE(backend_->Set(Req(R"("requester": 1001, "version": ")" + v2 + R"(", "text": {"x": 1},
-        "binary_files": [{"name": "c.bin", "format": "raw", "path": ")" + scratch_.file("missing") + R"("}])"),
+        "binary_files": [{"name": "d.txt", "format": "raw", "path": ")" + scratch_.file("missing") + R"("}])"),
                                strVer));
     EXPECT_EQ(TESSEL_ERR_OPEN_FILE, ErrCode());
     const Msgs msgs = ErrMsgs();
-    ASSERT_LE(3u, msgs.size());
+    ASSERT_LE(4u, msgs.size());
     EXPECT_EQ((Msgs{"!TesselObjectEvalFileMd5(strFile.c_str(), strMd5)",
                     "!TesselObjectVersionDataToDisk(pAddHash, pDelHash, m_jParm, strTmpDir)", "!mf_SaveGit(strNewVer)",
                     "!mf_SaveConfig(strNewVer)"}),
