@@ -9,7 +9,10 @@
 #include <time.h>
 #include <unistd.h>
 
+#include <cstdint>
+#include <filesystem>
 #include <memory>
+#include <system_error>
 #include <string>
 #include <vector>
 
@@ -38,8 +41,6 @@ namespace {
 constexpr int GIT_OK = 0;
 // Room for the paths of one change before the table grows.
 constexpr int kPathTableSize = 1024;
-constexpr const char SZ_RM[] = "/bin/rm";
-constexpr const char SZ_RM_RECURSIVE[] = "-rf";
 constexpr const char SZ_DELETE[] = "delete";
 
 // Owns a path table for the length of one save.
@@ -56,6 +57,10 @@ struct PathTable {
 };
 
 // Removes a checked-out version or a save's staging files on every path out.
+// Removed in this process, not by running a remover program: a save or a
+// read of an older version would otherwise spend more time starting that
+// program than Git spends on the commit. remove_all never follows a link
+// out of the work area.
 class WorkAreaRemover {
 public:
     WorkAreaRemover() = default;
@@ -67,8 +72,9 @@ public:
             return;
         }
         TESSEL_AS_ROOT();
-        if (0 != QLIBCExec(SZ_RM, SZ_RM_RECURSIVE, m_strDir.c_str(), NULL)) {
-            TESSEL_LOG_FAILED("0 != QLIBCExec(\"/bin/rm\", \"-rf\", m_strDir.c_str(), NULL)");
+        std::error_code ec;
+        if (static_cast<std::uintmax_t>(-1) == std::filesystem::remove_all(m_strDir, ec) || ec) {
+            TESSEL_LOG_FAILED("!remove_all(m_strDir), dir=%s (%s)", m_strDir.c_str(), ec.message().c_str());
         }
     }
 

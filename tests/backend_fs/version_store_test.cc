@@ -344,6 +344,24 @@ TEST_F(VersionStore, ListsDiffsAndRenames) {
     EXPECT_EQ((Msgs{"segment error, segment=\"meta\"", "!mf_RenameGitField(strNewVer)"}), ErrMsgs());
 }
 
+TEST_F(VersionStore, SetOwnerHandsEveryFileOver) {
+    const std::string v1 = Create(R"("mtime": 1700000000, "text": {"a": 1}, "metatext": {"m": 1})");
+    std::string strVer;
+    EXPECT_FALSE(backend_->SetOwner(Req(R"("new_owner": 4242)"), strVer));
+    EXPECT_EQ(TESSEL_ERR_USER_NOT_EXISTS, ErrCode());
+    EXPECT_EQ(Msgs{"!TesselCheckUID(newOwner)"}, ErrMsgs());
+    ASSERT_TRUE(backend_->SetOwner(Req(R"("new_owner": 1002)"), strVer)) << ::testing::PrintToString(ErrMsgs());
+    EXPECT_EQ(v1, strVer);
+    size_t nEntries = 0;
+    for (const auto &entry : fs::recursive_directory_iterator(Base())) {
+        struct stat st;
+        ASSERT_EQ(0, lstat(entry.path().c_str(), &st));
+        EXPECT_EQ(kUidBob, st.st_uid) << entry.path();
+        ++nEntries;
+    }
+    EXPECT_LT(10u, nEntries);
+}
+
 // Downloads the request's binary in a child whose standard output goes to a
 // file: the response, and the child's error frames when it failed.
 std::pair<std::string, Msgs> Download(const Json::Value &jParm) {
