@@ -159,8 +159,8 @@ const Json::Value &StoredCommitMsg(const Json::Value &jCommitInfo) {
 
 bool TESSEL_BACKEND_FS::TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLIBSZHASH *&pDelHash,
                                                       const Json::Value &jParm, const std::string &strDir) {
-    TESSEL_CHECK(NULL == pAddHash || NULL == pDelHash, TESSEL_ERR_BAD_PARAMETERS, "NULL == pAddHash || NULL == pDelHash",
-                 false);
+    TESSEL_CHECK(NULL == pAddHash || NULL == pDelHash, TESSEL_ERR_BAD_PARAMETERS,
+                 "NULL == pAddHash || NULL == pDelHash", false);
     const Json::Value jRaw = jParm.isMember("raw_text") ? jParm["raw_text"] : Json::Value(Json::objectValue);
     const unsigned int owner = tessel::FsRequestUid(jParm["owner"]);
     const Json::Int64 mtime = jParm["mtime"].isIntegral() ? jParm["mtime"].asInt64() : (Json::Int64)time(NULL);
@@ -198,11 +198,10 @@ bool TESSEL_BACKEND_FS::TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLI
                 TESSEL_CHECK(!QLIBCFileExist(strSrcInfo.c_str()), TESSEL_ERR_NOT_EXISTS,
                              "!QLIBCFileExist(strSrcInfo.c_str())", false);
                 Json::Value jSrcInfo;
-                TESSEL_CHECK(!tessel::fromFile(jSrcInfo, strSrcInfo) || !jSrcInfo.isObject() ||
-                                 !jSrcInfo.isMember("md5"),
-                             TESSEL_ERR_READ_FILE,
-                             "!jSrcInfo.fromFile(strSrcInfo) || !jSrcInfo.isObject() || !jSrcInfo.isMember(\"md5\")",
-                             false);
+                TESSEL_CHECK(
+                    !tessel::fromFile(jSrcInfo, strSrcInfo) || !jSrcInfo.isObject() || !jSrcInfo.isMember("md5"),
+                    TESSEL_ERR_READ_FILE,
+                    "!jSrcInfo.fromFile(strSrcInfo) || !jSrcInfo.isObject() || !jSrcInfo.isMember(\"md5\")", false);
                 TESSEL_CHECK(0 != QLIBCSzHashSetValue(pAddHash, strBinKey.c_str(), strSrcFile.c_str()) ||
                                  0 != QLIBCSzHashSetValue(pAddHash, strInfoKey.c_str(), strSrcInfo.c_str()),
                              TESSEL_ERR_OUT_OF_MEMORY, "0 != QLIBCSzHashSetValue(pAddHash, ...)", false);
@@ -242,8 +241,7 @@ bool TESSEL_BACKEND_FS::TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLI
         for (Json::Value::const_iterator it = jText.begin(); it != jText.end(); ++it) {
             const std::string strName = it.name();
             std::string strNameEncode;
-            TESSEL_CHECK_APPEND(!TesselEncode(strName, strNameEncode), "!TesselEncode(strName, strNameEncode)",
-                                false);
+            TESSEL_CHECK_APPEND(!TesselEncode(strName, strNameEncode), "!TesselEncode(strName, strNameEncode)", false);
             const std::string strKey = TESSEL_GIT_TEXT "/" + strNameEncode;
             if (it->isNull()) {
                 TESSEL_CHECK(0 != QLIBCSzHashSetValue(pDelHash, strKey.c_str(), SZ_DELETE), TESSEL_ERR_OUT_OF_MEMORY,
@@ -259,9 +257,8 @@ bool TESSEL_BACKEND_FS::TesselObjectVersionDataToDisk(QLIBSZHASH *&pAddHash, QLI
             } else {
                 TESSEL_CHECK_APPEND(!TesselJsonToFile(*it, strFile), "!TesselJsonToFile(*it, strFile)", false);
             }
-            TESSEL_CHECK(0 != QLIBCSzHashSetValue(pAddHash, strKey.c_str(), strFile.c_str()),
-                         TESSEL_ERR_OUT_OF_MEMORY, "0 != QLIBCSzHashSetValue(pAddHash, strKey.c_str(), strFile.c_str())",
-                         false);
+            TESSEL_CHECK(0 != QLIBCSzHashSetValue(pAddHash, strKey.c_str(), strFile.c_str()), TESSEL_ERR_OUT_OF_MEMORY,
+                         "0 != QLIBCSzHashSetValue(pAddHash, strKey.c_str(), strFile.c_str())", false);
         }
     }
     return true;
@@ -271,8 +268,10 @@ bool TESSEL_BACKEND_FS::mf_CountCommit(const Json::Value &jCommitMsg) {
     Json::Value jOld;
     TESSEL_CHECK_APPEND(!mf_GetJsonFile(TESSEL_GIT_INFO, jOld), "!mf_GetJsonFile(TESSEL_GIT_INFO, jOld)", false);
     Json::Value jGitInfo = jOld;
-    const Json::Int64 commitCnt = jOld[TESSEL_GIT_INFO_COMMIT_CNT].isIntegral() ? jOld[TESSEL_GIT_INFO_COMMIT_CNT].asInt64() : 0;
-    const Json::Int64 listableCnt = jOld[TESSEL_GIT_INFO_LISTABLE_CNT].isIntegral() ? jOld[TESSEL_GIT_INFO_LISTABLE_CNT].asInt64() : 0;
+    const Json::Int64 commitCnt =
+        jOld[TESSEL_GIT_INFO_COMMIT_CNT].isIntegral() ? jOld[TESSEL_GIT_INFO_COMMIT_CNT].asInt64() : 0;
+    const Json::Int64 listableCnt =
+        jOld[TESSEL_GIT_INFO_LISTABLE_CNT].isIntegral() ? jOld[TESSEL_GIT_INFO_LISTABLE_CNT].asInt64() : 0;
     jGitInfo[TESSEL_GIT_INFO_COMMIT_CNT] = commitCnt + 1;
     jGitInfo[TESSEL_GIT_INFO_LISTABLE_CNT] = listableCnt + (IsListable(jCommitMsg) ? 1 : 0);
     const std::string strFilePath = m_jPathInfo[TESSEL_GIT_INFO].asString();
@@ -384,8 +383,9 @@ bool TESSEL_BACKEND_FS::mf_LoadGitVersion(std::string &strDir, bool *pblIsLatest
     if (GIT_OK != GitLoadCommit(strRepo.c_str(), jParm["version"].asCString(), strTmpDir.c_str(), jCommitInfo)) {
         WorkAreaRemover remover;
         remover.Arm(strTmpDir);
-        TESSEL_APPEND("GIT_OK != GitLoadCommit(m_jPathInfo[TESSEL_VERSION].asCString(), "
-                      "m_jParm[\"version\"].asCString(), strTmpDir.c_str(), jCommitInfo)");
+        TESSEL_APPEND(
+            "GIT_OK != GitLoadCommit(m_jPathInfo[TESSEL_VERSION].asCString(), "
+            "m_jParm[\"version\"].asCString(), strTmpDir.c_str(), jCommitInfo)");
         return false;
     }
     strDir = strTmpDir;
@@ -404,8 +404,8 @@ bool TESSEL_BACKEND_FS::mf_GetGit(TESSEL_OBJECT *pObject) {
     std::string strDir;
     bool blIsLatest = true;
     Json::Value jCommitInfo;
-    TESSEL_CHECK_APPEND(!mf_LoadGitVersion(strDir, &blIsLatest, jCommitInfo),
-                        "!mf_LoadGitVersion(strDir, &blIsLatest)", false);
+    TESSEL_CHECK_APPEND(!mf_LoadGitVersion(strDir, &blIsLatest, jCommitInfo), "!mf_LoadGitVersion(strDir, &blIsLatest)",
+                        false);
     WorkAreaRemover remover;
     if (!blIsLatest) {
         remover.Arm(strDir);
@@ -471,8 +471,7 @@ bool TESSEL_BACKEND_FS::mf_VersionDataFromDisk(const std::string &strDir, TESSEL
                 continue;
             }
             std::string strNameEncode;
-            TESSEL_CHECK_APPEND(!TesselEncode(strName, strNameEncode), "!TesselEncode(strName, strNameEncode)",
-                                false);
+            TESSEL_CHECK_APPEND(!TesselEncode(strName, strNameEncode), "!TesselEncode(strName, strNameEncode)", false);
             if (!readField(strName, strTextDir + "/" + strNameEncode)) {
                 return false;
             }
@@ -493,8 +492,8 @@ bool TESSEL_BACKEND_FS::mf_DownloadVersionBinary() {
     std::string strDir;
     bool blIsLatest = true;
     Json::Value jCommitInfo;
-    TESSEL_CHECK_APPEND(!mf_LoadGitVersion(strDir, &blIsLatest, jCommitInfo),
-                        "!mf_LoadGitVersion(strDir, &blIsLatest)", false);
+    TESSEL_CHECK_APPEND(!mf_LoadGitVersion(strDir, &blIsLatest, jCommitInfo), "!mf_LoadGitVersion(strDir, &blIsLatest)",
+                        false);
     WorkAreaRemover remover;
     if (!blIsLatest) {
         remover.Arm(strDir);
@@ -583,7 +582,8 @@ bool TESSEL_BACKEND_FS::mf_RenameGitField(std::string &strNewVer) {
     } else if (strSegment == TESSEL_GIT_BIN) {
         folders = {TESSEL_GIT_BIN, TESSEL_GIT_BIN_INFO};
     } else {
-        TESSEL_RAISE(TESSEL_ERR_BAD_PARAMETERS, "segment error, segment=%s", tessel::toString(jParm["segment"]).c_str());
+        TESSEL_RAISE(TESSEL_ERR_BAD_PARAMETERS, "segment error, segment=%s",
+                     tessel::toString(jParm["segment"]).c_str());
         return false;
     }
     for (const char *szFolder : folders) {
@@ -605,13 +605,13 @@ bool TESSEL_BACKEND_FS::mf_RenameGitField(std::string &strNewVer) {
     const long long mtime = jParm["mtime"].isIntegral() ? jParm["mtime"].asInt64() : (long long)time(NULL);
     const std::string strBase = jParm["version"].asString();
     TESSEL_AS_ROOT();
-    TESSEL_CHECK_APPEND(GIT_OK != GitCommit(m_jPathInfo[TESSEL_VERSION].asCString(), strBase.c_str(), mtime, add.p,
-                                            del.p, rename.p, strAuthor.c_str(), strMail.c_str(),
-                                            tessel::toString(jMsg).c_str(), strNewVer),
-                        "GIT_OK != GitCommit(m_jPathInfo[TESSEL_VERSION].asCString(), "
-                        "m_jParm[\"version\"].asCString(), mtime, pAddHash, pDelHash, pRenameHash, "
-                        "strAuthor.c_str(), strMail.c_str(), strMsg.c_str(), strNewVer)",
-                        false);
+    TESSEL_CHECK_APPEND(
+        GIT_OK != GitCommit(m_jPathInfo[TESSEL_VERSION].asCString(), strBase.c_str(), mtime, add.p, del.p, rename.p,
+                            strAuthor.c_str(), strMail.c_str(), tessel::toString(jMsg).c_str(), strNewVer),
+        "GIT_OK != GitCommit(m_jPathInfo[TESSEL_VERSION].asCString(), "
+        "m_jParm[\"version\"].asCString(), mtime, pAddHash, pDelHash, pRenameHash, "
+        "strAuthor.c_str(), strMail.c_str(), strMsg.c_str(), strNewVer)",
+        false);
     if (strNewVer != strBase) {
         TESSEL_CHECK_APPEND(!mf_CountCommit(jCommitMsg), "!mf_CountCommit(jCommitMsg)", false);
     }

@@ -78,13 +78,13 @@ int TESSEL_BACKEND_FS::mf_ListVersionGit(TESSEL_OBJECT_VERSION **addrPHead) {
     int count = -1;
     {
         TESSEL_AS_ROOT();
-        TESSEL_CHECK_APPEND(-1 == (count = GitListCommitHistory(m_jPathInfo[TESSEL_VERSION].asCString(),
-                                                                jParm["limit"].asInt(), jParm["offset"].asUInt(),
-                                                                reverse, jParm["filter"], jList)),
-                            "-1 == (count = GitListCommitHistory(m_jPathInfo[TESSEL_VERSION].asCString(), "
-                            "m_jParm[\"limit\"].asInt(), m_jParm[\"offset\"].asUInt(), reverse, m_jParm[\"filter\"], "
-                            "jList))",
-                            -1);
+        TESSEL_CHECK_APPEND(
+            -1 == (count = GitListCommitHistory(m_jPathInfo[TESSEL_VERSION].asCString(), jParm["limit"].asInt(),
+                                                jParm["offset"].asUInt(), reverse, jParm["filter"], jList)),
+            "-1 == (count = GitListCommitHistory(m_jPathInfo[TESSEL_VERSION].asCString(), "
+            "m_jParm[\"limit\"].asInt(), m_jParm[\"offset\"].asUInt(), reverse, m_jParm[\"filter\"], "
+            "jList))",
+            -1);
     }
     TESSEL_OBJECT_VERSION *pHead = NULL;
     TESSEL_OBJECT_VERSION **ppTail = &pHead;
@@ -122,7 +122,11 @@ int TESSEL_BACKEND_FS::VersionList(const Json::Value &jParm, TESSEL_OBJECT_VERSI
         TESSEL_APPEND("!mf_GetJsonFile(TESSEL_GIT_INFO, jGitInfo)");
         return -1;
     }
-    total = jGitInfo[TESSEL_GIT_INFO_COMMIT_CNT].isIntegral() ? (unsigned int)jGitInfo[TESSEL_GIT_INFO_COMMIT_CNT].asInt() : 0;
-    listable_total = jGitInfo[TESSEL_GIT_INFO_LISTABLE_CNT].isIntegral() ? (unsigned int)jGitInfo[TESSEL_GIT_INFO_LISTABLE_CNT].asInt() : 0;
+    total = jGitInfo[TESSEL_GIT_INFO_COMMIT_CNT].isIntegral()
+                ? (unsigned int)jGitInfo[TESSEL_GIT_INFO_COMMIT_CNT].asInt()
+                : 0;
+    listable_total = jGitInfo[TESSEL_GIT_INFO_LISTABLE_CNT].isIntegral()
+                         ? (unsigned int)jGitInfo[TESSEL_GIT_INFO_LISTABLE_CNT].asInt()
+                         : 0;
     return count;
 }

@@ -239,8 +239,7 @@ void BM_GitLayerCommit(benchmark::State &state) {
     QLIBSZHASH *pDel = QLIBCSzHashAlloc(16);
     QLIBSZHASH *pAdd = StageFields(strRepo, ThreeFields(0));
     std::string strVer;
-    const int rc =
-        GitCreateRepository(strRepo.c_str(), kT0, pAdd, pDel, "alice", "alice@example.com", "{}", strVer);
+    const int rc = GitCreateRepository(strRepo.c_str(), kT0, pAdd, pDel, "alice", "alice@example.com", "{}", strVer);
     QLIBCSzHashFree(pAdd);
     if (rc != 0) {
         state.SkipWithError("setup failed");
@@ -302,8 +301,11 @@ BENCHMARK(BM_BaselineCommit);
 
 int main(int argc, char **argv) {
     // The namespace placed as the library's linked scheme finds it.
-    if (system(("mkdir -p " + kNsDir + " " + kWorkDir + " /volume1/@tmp/@Tessel/bench /usr/quor/etc/tessel/ns &&"
-                " ln -sfn " + kNsDir + " /usr/quor/etc/tessel/ns/bench").c_str()) != 0) {
+    if (system(("mkdir -p " + kNsDir + " " + kWorkDir +
+                " /volume1/@tmp/@Tessel/bench /usr/quor/etc/tessel/ns &&"
+                " ln -sfn " +
+                kNsDir + " /usr/quor/etc/tessel/ns/bench")
+                   .c_str()) != 0) {
         fprintf(stderr, "cannot place the namespace (run through bench/run)\n");
         return 1;
     }
