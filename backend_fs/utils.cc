@@ -14,6 +14,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <utility>
 #include <memory>
 #include <set>
 
@@ -159,10 +160,17 @@ bool FsParseFieldTable(Json::Value &jTable, std::vector<std::string> &order) {
     const std::string strText = kFieldTable;
     TESSEL_CHECK(!fromString(jTable, strText) || !jTable.isObject(), TESSEL_ERR_UNEXPECTED,
                  "!jTable.fromString(kFieldTable)", false);
-    order = jTable.getMemberNames();
-    std::sort(order.begin(), order.end(), [&strText](const std::string &a, const std::string &b) {
-        return strText.find("\"" + a + "\":[") < strText.find("\"" + b + "\":[");
-    });
+    // Each name's place in the text, found once: every store made for an
+    // operation does this, so it must stay cheap.
+    std::vector<std::pair<size_t, std::string>> places;
+    for (const std::string &strName : jTable.getMemberNames()) {
+        places.emplace_back(strText.find("\"" + strName + "\":["), strName);
+    }
+    std::sort(places.begin(), places.end());
+    order.clear();
+    for (auto &place : places) {
+        order.push_back(std::move(place.second));
+    }
     return true;
 }
 
