@@ -25,6 +25,7 @@
 #include "tessel_file.h"
 #include "tessel_id.h"
 #include "tessel_ns.h"
+#include "tesselobject.h"
 
 static constexpr const char kTesselModule[] = "common/tessel_common";
 
@@ -369,5 +370,28 @@ BOOL TesselRootFSMkdirP(const char *szPath, unsigned int uid, mode_t mode) {
     TESSEL_AS_ROOT();
     TESSEL_CHECK(0 > QUORFSMkdirP(szPath, NULL, TRUE, uid, GID_USERS, mode), TESSEL_ERR_MKDIR,
                  "0 > QUORFSMkdirP(szPath, NULL, TRUE, uid, GID_USERS, mode)", FALSE);
+    return TRUE;
+}
+
+// The objects lose their parent (it is gone): each returns to its owner's top
+// level through the list set, as root, keeping its acl. A single id is taken
+// as a list of one.
+BOOL TesselResetParentID(const std::string &strNs, const Json::Value &jIds) {
+    Json::Value jSetParm(Json::objectValue);
+    jSetParm["ns"] = strNs;
+    if (jIds.isArray()) {
+        jSetParm["id"] = jIds;
+    } else {
+        jSetParm["id"].append(jIds);
+    }
+    jSetParm["reset_parent_id"] = true;
+    jSetParm["requester"] = 0;
+    TESSEL_OBJECT_LIST list;
+    Json::Value jsResult(Json::objectValue);
+    TESSEL_CHECK_APPEND(!list.Set(jSetParm, jsResult), "!list.Set(jSetParm, jsResult)", FALSE);
+    // A record that could not be reset fails the call; the others stay reset.
+    for (const std::string &strId : jsResult.getMemberNames()) {
+        TESSEL_CHECK(!jsResult[strId].asBool(), TESSEL_ERR_OPERATION_FAILED, "!jsResult[strId].asBool()", FALSE);
+    }
     return TRUE;
 }
