@@ -48,6 +48,7 @@ const TESSEL_ERROR_STRING rgErrorString[TESSEL_ERROR_STRING_COUNT] = {
     {1028, "No application privilege for the namespace.", NULL, NULL},
     {1029, "Update configuration file failed.", NULL, NULL},
     {1030, "Object owner is disabled or expired.", NULL, NULL},
+    {1031, "Object ID already exists.", NULL, NULL},
 };
 
 }  // extern "C"

@@ -53,7 +53,7 @@ enum {
     TESSEL_ERR_NO_APP_PRIV = 1028,         /* "No application privilege for the namespace." */
     TESSEL_ERR_UPDATE_CONF = 1029,         /* "Update configuration file failed." */
     TESSEL_ERR_OWNER_INVALID = 1030,       /* "Object owner is disabled or expired." */
-    TESSEL_ERR_ID_EXISTS = 1031,           /* an identifier that already exists (no message) */
+    TESSEL_ERR_ID_EXISTS = 1031,           /* "Object ID already exists." */
     TESSEL_ERR_MKDIR = 1032,               /* a directory could not be created */
     TESSEL_ERR_COPY_FILE = 1035,           /* a file copy failed */
     TESSEL_ERR_RENAME_TABLE = 1036,        /* a rename table could not be filled */
@@ -72,11 +72,11 @@ typedef struct _tag_TESSEL_ERROR_STRING {
 TESSEL_C_BEGIN
 
 /*
- * The code table, 1000 to 1030 in a fixed order (1005 stands before 1004).
- * The codes below 1000 and above 1030 have no entry, so a report of one of
+ * The code table, 1000 to 1031 in a fixed order (1005 stands before 1004).
+ * The codes below 1000 and above 1031 have no entry, so a report of one of
  * them carries no "ErrNo" line.
  */
-#define TESSEL_ERROR_STRING_COUNT 31
+#define TESSEL_ERROR_STRING_COUNT 32
 TESSEL_EXPORT extern const TESSEL_ERROR_STRING rgErrorString[TESSEL_ERROR_STRING_COUNT];
 
 /* Starts a new error: the stack afterwards holds exactly this frame. */

@@ -198,7 +198,8 @@ TEST(ErrorStack, GetStringGivesTheInterfaceKeyNotTheMessage) {
         {1005, nullptr, ""},
         {1030, nullptr, ""},
         {999, "", kUntouched},   // unknown: section place left alone
-        {1031, "", kUntouched},  // a code without a table entry
+        {1031, nullptr, ""},
+        {1032, "", kUntouched},  // a code without a table entry
         {902, "", kUntouched},
         {0, "", kUntouched},
     };
@@ -218,7 +219,7 @@ TEST(ErrorStack, GetStringGivesTheInterfaceKeyNotTheMessage) {
 
 TEST(ErrorStack, CodeTableOrder) {
     std::vector<int> want = {1000, 1001, 1002, 1003, 1005, 1004};
-    for (int code = 1006; code <= 1030; ++code) {
+    for (int code = 1006; code <= 1031; ++code) {
         want.push_back(code);
     }
     ASSERT_EQ(want.size(), static_cast<size_t>(TESSEL_ERROR_STRING_COUNT));
@@ -244,7 +245,8 @@ TEST(ErrorReport, PrintLayout) {
         {1024, "  ErrNo=[1024] (PostgresSQL service is disabled.)\n"},
         {1027, "  ErrNo=[1027] (tessel is disabled.)\n"},
         {1030, "  ErrNo=[1030] (Object owner is disabled or expired.)\n"},
-        {1031, ""},
+        {1031, "  ErrNo=[1031] (Object ID already exists.)\n"},
+        {1032, ""},
         {900, ""},
         {999, ""},
     };
