@@ -29,6 +29,8 @@ bool PreCheck(const Json::Value &jParm) {
                  "!jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"requester\") || "
                  "!jParm[\"requester\"].isIntegral()",
                  false);
+    // Wider than a uid would wrap onto another user's id.
+    TESSEL_CHECK(!jParm["requester"].isUInt(), TESSEL_ERR_USER_INPUT, "!jParm[\"requester\"].isUInt()", false);
     if (0 != tessel::UidOf(jParm["requester"])) {
         TESSEL_CHECK_APPEND(FALSE == TesselAccessCheck(jParm["ns"].asCString()),
                             "FALSE == TesselAccessCheck(jParm[\"ns\"].asCString())", false);
@@ -43,6 +45,7 @@ bool AppendRecord(TESSEL_OBJECT **&ppTail, const Json::Value *pId) {
     TESSEL_CHECK_APPEND(NULL == (*ppObj = TesselObjectAlloc()), "NULL == (*ppObj = TesselObjectAlloc())", false);
     if (pId) {
         (*ppObj)->m_param["id"] = *pId;
+        (*ppObj)->set_id(pId->isString() ? pId->asString() : std::string());
     }
     ppTail = &(*ppObj)->next;
     return true;

@@ -137,6 +137,8 @@ bool TESSEL_OBJECT_LIST::Set(const Json::Value &jParm, Json::Value &jsResult) {
                  "!jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"requester\") || "
                  "!jParm[\"requester\"].isIntegral()",
                  false);
+    // Wider than a uid would wrap onto another user's id.
+    TESSEL_CHECK(!jParm["requester"].isUInt(), TESSEL_ERR_USER_INPUT, "!jParm[\"requester\"].isUInt()", false);
     if (empty()) {
         TESSEL_CHECK_APPEND(!PrepareList(jParm, &m_head), "!PrepareList(jParm, &m_head)", false);
     }

@@ -106,7 +106,7 @@ bool PrepareCreateParm(Json::Value &jParm) {
         jParm["owner"] = jParm["requester"];
     }
     // Not among the documented checks, but every later step reads it as a uid.
-    TESSEL_CHECK(!jParm["owner"].isIntegral(), TESSEL_ERR_USER_INPUT, "!jParm[\"owner\"].isIntegral()", false);
+    TESSEL_CHECK(!jParm["owner"].isUInt(), TESSEL_ERR_USER_INPUT, "!jParm[\"owner\"].isUInt()", false);
     unsigned int owner = tessel::UidOf(jParm["owner"]);
     const std::string strNs = jParm["ns"].asString();
     if (!jParm.isMember("parent_id")) {
@@ -175,6 +175,8 @@ bool CreateOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &j
                  "!jParm[\"category\"].isString() || !jParm.isMember(\"requester\") || "
                  "!jParm[\"requester\"].isIntegral()",
                  false);
+    // Wider than a uid would wrap onto another user's id.
+    TESSEL_CHECK(!jParm["requester"].isUInt(), TESSEL_ERR_USER_INPUT, "!jParm[\"requester\"].isUInt()", false);
     const unsigned int requester = tessel::UidOf(jParm["requester"]);
     if (0 != requester) {
         TESSEL_CHECK_APPEND(FALSE == TesselAccessCheck(jParm["ns"].asCString()),

@@ -230,6 +230,8 @@ bool SetOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &jPar
                  "!jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"id\") || "
                  "!jParm[\"id\"].isString() || !jParm.isMember(\"requester\") || !jParm[\"requester\"].isIntegral()",
                  false);
+    // Wider than a uid would wrap onto another user's id.
+    TESSEL_CHECK(!jParm["requester"].isUInt(), TESSEL_ERR_USER_INPUT, "!jParm[\"requester\"].isUInt()", false);
     const unsigned int requester = tessel::UidOf(jParm["requester"]);
     if (0 != requester) {
         TESSEL_CHECK_APPEND(FALSE == TesselAccessCheck(jParm["ns"].asCString()),
