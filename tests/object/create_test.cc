@@ -53,7 +53,7 @@ TEST_F(Create, RefusedRequestsWriteNothing) {
          {"owner != TesselObjectGetOwnerByID(jParm[\"id\"].asString())", kPrepare}},
         {Req(kUidAlice, "\"category\": \"note\", \"id\": \"" + strTaken + "\""), TESSEL_ERR_ID_EXISTS,
          {"TesselIDIsExist(jParm[\"ns\"].asString(), jParm[\"id\"].asString())", kPrepare}},
-        {Req(kUidAlice, R"("category": "note", "id": "1001_..")"), TESSEL_ERR_USER_INPUT,
+        {Req(kUidAlice, R"("category": "note", "id": "1001_x/y")"), TESSEL_ERR_USER_INPUT,
          {"!TesselIsPathComponent(jParm[\"id\"].asString())", kPrepare}},
         {Req(kUidAlice, R"("category": "note", "ctime": "now")"), TESSEL_ERR_USER_INPUT,
          {"!jParm[\"ctime\"].isIntegral()", kPrepare}},
