@@ -117,7 +117,7 @@ bool PrepareParent(Json::Value &jParm, const Json::Value &oldAcl) {
     const bool blReset = jParm.isMember("reset_parent_id");
     TESSEL_CHECK(blReset && jParm.isMember("parent_id"), TESSEL_ERR_USER_INPUT,
                  "jParm.isMember(\"parent_id\") && jParm.isMember(\"reset_parent_id\")", false);
-    TESSEL_CHECK(!blReset && !jParm["parent_id"].isString(), TESSEL_ERR_USER_INPUT,
+    TESSEL_CHECK(!blReset && !tessel::MemberOf(jParm, "parent_id").isString(), TESSEL_ERR_USER_INPUT,
                  "!jParm[\"parent_id\"].isString()", false);
     TESSEL_CHECK(jParm.isMember("acl_inherit") && !jParm["acl_inherit"].isBool(), TESSEL_ERR_USER_INPUT,
                  "!jParm[\"acl_inherit\"].isBool()", false);
@@ -150,7 +150,8 @@ bool PrepareParent(Json::Value &jParm, const Json::Value &oldAcl) {
             jParm["parent_id"] = TesselObjectDefaultID(owner);
         }
     }
-    if (jParm["acl_inherit"].isBool() && jParm["acl_inherit"].asBool()) {
+    const Json::Value &jInherit = tessel::MemberOf(jParm, "acl_inherit");
+    if (jInherit.isBool() && jInherit.asBool()) {
         jParm["acl"] = AclFromNewParent(oldAcl, jParentAcl);
     }
     return CheckParentTime(jParm, owner);
