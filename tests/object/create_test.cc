@@ -146,9 +146,10 @@ TEST_F(Create, UnderASharedParentBelongsToItsOwner) {
               jChild["acl"]);
     EXPECT_EQ("1001", Sql("SELECT owner FROM object WHERE id = '" + strChild + "'"));
     // An acl of the creator's own keeps everything but an entry for the owner.
-    const std::string strOwn = Made(kUidBob, "\"parent_id\": \"" + strFolder +
-                                                 R"(", "acl": {"enabled": true, "zem_user": {"1001": {"perm": "ro"}}})");
-    EXPECT_EQ(Parse(R"({"enabled": true})"), Stored(strOwn)["acl"]);
+    const std::string strOwn =
+        Made(kUidBob, "\"parent_id\": \"" + strFolder +
+                          R"(", "acl": {"enabled": true, "zem_user": {"1001": {"perm": "ro"}, "1002": {"perm": "rw"}}})");
+    EXPECT_EQ(Parse(R"({"enabled": true, "zem_user": {"1002": {"perm": "rw"}}})"), Stored(strOwn)["acl"]);
     // A reader of the parent may not create in it.
     ErrClear();
     TESSEL_OBJECT obj;
