@@ -162,17 +162,11 @@ TEST(VersionToJson, SelectionsAuthorNamesAndAResultThatIsNotAnObject) {
     EXPECT_EQ(R"({"id":"1001_ABC","mtime":1700000000,"ns":"notes"})",
               ToJson(ver, R"({"ns": true, "id": "yes", "version": false, "author": 0, "commit_msg": false,)"
                           R"( "last_version": null})"));
-    // A domain user's display name, a directory-style name, a removed
-    // account, no user at all.
-    const std::pair<unsigned long, const char *> authors[] = {{tessel_test::kUidErin, "Erin Example"},
-                                                               {tessel_test::kUidGrace, "grace@example.com"},
-                                                               {tessel_test::kUidUnknown, "Deleted user #4242"},
-                                                               {4294967295UL, "Anonymous"}};
-    for (const auto &a : authors) {
-        ver.set_author(a.first);
-        EXPECT_EQ(std::string("{\"author\":\"") + a.second + "\"}",
-                  ToJson(ver, R"({"version":false,"mtime":false,"commit_msg":false,"last_version":false})"));
-    }
+    // The name comes from the user look-up, whatever it answers: here, for
+    // an account that no longer exists.
+    ver.set_author(tessel_test::kUidUnknown);
+    EXPECT_EQ(R"({"author":"Deleted user #4242"})",
+              ToJson(ver, R"({"version":false,"mtime":false,"commit_msg":false,"last_version":false})"));
 
     Json::Value jRet(Json::arrayValue);
     size_t mark = tessel_test::SyslogMark();
