@@ -159,7 +159,14 @@ std::string HeadOf(const std::string &strRepo) {
     return szOid;
 }
 
+// Every file-system store initialises libgit2 and shuts it down again, and a
+// first initialisation loads the TLS trust store: an application that keeps
+// libgit2 initialised avoids that, as the baselines do. state.range(0) 1
+// holds it over the loop, 0 shows the cost of not holding it.
 void BM_Create(benchmark::State &state) {
+    if (state.range(0)) {
+        git_libgit2_init();
+    }
     if (!Setup()) {
         state.SkipWithError("no namespace");
         return;
@@ -172,8 +179,11 @@ void BM_Create(benchmark::State &state) {
             break;
         }
     }
+    if (state.range(0)) {
+        git_libgit2_shutdown();
+    }
 }
-BENCHMARK(BM_Create)->Unit(benchmark::kMillisecond);
+BENCHMARK(BM_Create)->Arg(0)->Arg(1)->Unit(benchmark::kMillisecond);
 
 void BM_CreateBaseline(benchmark::State &state) {
     git_libgit2_init();
@@ -208,6 +218,9 @@ void BM_CreateBaseline(benchmark::State &state) {
 BENCHMARK(BM_CreateBaseline)->Unit(benchmark::kMillisecond);
 
 void BM_Set(benchmark::State &state) {
+    if (state.range(0)) {
+        git_libgit2_init();
+    }
     TESSEL_OBJECT obj;
     if (!Setup() || !obj.Create(CreateParm(0))) {
         state.SkipWithError("no object");
@@ -226,8 +239,11 @@ void BM_Set(benchmark::State &state) {
             break;
         }
     }
+    if (state.range(0)) {
+        git_libgit2_shutdown();
+    }
 }
-BENCHMARK(BM_Set)->Unit(benchmark::kMillisecond);
+BENCHMARK(BM_Set)->Arg(0)->Arg(1)->Unit(benchmark::kMillisecond);
 
 void BM_SetBaseline(benchmark::State &state) {
     git_libgit2_init();

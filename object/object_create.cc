@@ -215,7 +215,10 @@ bool CreateOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &j
                         "!TesselSettingsIndexGetFromCache(jGetParm[\"ns\"].asString(), jGetParm[\"field_filter\"])",
                         false);
     TESSEL_CHECK_APPEND(!self.Get(jGetParm), "!Get(jGetParm)", false);
-    TESSEL_CHECK_APPEND(!TesselObjectIndex(strNewID.c_str(), jParm["ns"].asCString(), requester),
+    // Indexing by id would read the object again just as it was read back
+    // here (same requester, every field, the index filter): the record read
+    // is indexed instead, and the frame keeps the name callers know.
+    TESSEL_CHECK_APPEND(!TesselObjectIndex(&self),
                         "!TesselObjectIndex(strNewID.c_str(), jParm[\"ns\"].asCString(), "
                         "(uid_t)jParm[\"requester\"].asInt64())",
                         false);
