@@ -148,8 +148,9 @@ bool TESSEL_OBJECT_LIST::Create(const Json::Value &jParm, Json::Value &jsResult)
         if (pObj->get_ref_err().isBool() && !pObj->get_ref_err().asBool()) {
             jsId.append(pObj->get_ref_id());
             jsVersion[pObj->get_ref_id()] = pObj->get_ref_version();
-            if (pObj->m_param["copy_from_object"].isString()) {
-                jsResult[pObj->m_param["copy_from_object"].asString()] = pObj->get_ref_id();
+            const Json::Value &jSource = tessel::MemberOf(pObj->m_param, "copy_from_object");
+            if (jSource.isString()) {
+                jsResult[jSource.asString()] = pObj->get_ref_id();
             }
         }
     }

@@ -86,7 +86,7 @@ void RecordParam(const Json::Value &jParm, TESSEL_OBJECT *pObj) {
         }
     }
     jOwn["id"] = pObj->get_ref_id();
-    if (jOwn["version"].isObject()) {
+    if (tessel::MemberOf(jOwn, "version").isObject()) {
         const Json::Value jVersions = jOwn["version"];
         jOwn.removeMember("version");
         if (jVersions.isMember(pObj->get_ref_id())) {
