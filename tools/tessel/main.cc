@@ -20,6 +20,7 @@ const std::vector<Command> &Commands() {
     static const std::vector<Command> table = [] {
         std::vector<Command> t;
         AddGetCommands(t);
+        AddCreateSetCommands(t);
         AddNamespaceCommands(t);
         AddSettingsCommands(t);
         AddReindexCommands(t);
