@@ -3,12 +3,16 @@
  * its JSON on standard output, the error stack on standard error, its exit
  * codes, the settings file it leaves and the log lines it writes.
  */
+#include <dirent.h>
 #include <fcntl.h>
+#include <string.h>
 #include <grp.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <set>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -390,6 +394,144 @@ TEST_F(TesselCli, VersionsAndDownloadShowTheLibrarysRefusalsAndWriteNothing) {
               "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n" + disabled,
               download.err);
     EXPECT_NE(0, access(dir.file("a.txt").c_str(), F_OK));
+}
+
+/* A namespace "notes" switched on and placed on the volume of its package. */
+void PlaceNotes() {
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
+    ASSERT_EQ(0, Tessel({"settings", "access", "set", "--ns", "notes", "--pkg", "NotesApp", "on"}).code);
+    ASSERT_EQ(0, system("mkdir -p /volume2/@appstore/NotesApp /var/packages/NotesApp && "
+                        "ln -sfn /volume2/@appstore/NotesApp /var/packages/NotesApp/target"));
+    ASSERT_EQ(0, Tessel({"namespace", "create", "--ns", "notes"}).code);
+}
+
+/* The entries of a directory but "." and "..", sorted. */
+std::vector<std::string> Entries(const std::string &dir) {
+    std::vector<std::string> names;
+    if (DIR *d = opendir(dir.c_str())) {
+        while (struct dirent *e = readdir(d)) {
+            if (0 != strcmp(e->d_name, ".") && 0 != strcmp(e->d_name, "..")) {
+                names.push_back(e->d_name);
+            }
+        }
+        closedir(d);
+    }
+    std::sort(names.begin(), names.end());
+    return names;
+}
+
+TEST_F(TesselCli, CreatePrintsTheStoredObjectAndARefusedCreateLeavesNothing) {
+    ASSERT_NO_FATAL_FAILURE(PlaceNotes());
+    tessel_test::ScratchDir dir;
+    ASSERT_TRUE(dir.ok());
+    ASSERT_EQ(0, chmod(dir.path().c_str(), 0755));
+    ASSERT_TRUE(WriteFile(dir.file("list.txt"), "Milk\nBread\n"));
+    ASSERT_EQ(0, chmod(dir.file("list.txt").c_str(), 0644));
+    ASSERT_TRUE(WriteFile(dir.file("secret.txt"), "root only\n"));
+    ASSERT_EQ(0, chmod(dir.file("secret.txt").c_str(), 0600));
+
+    Result made = Tessel({"--as", "alice", "create", "--ns", "notes", "--category", "note", "--text", "title=Shopping",
+                          "--binary", "list.txt=" + dir.file("list.txt"), "--commit-msg", "first"});
+    ASSERT_EQ(0, made.code) << made.err;
+    EXPECT_EQ("", made.err);
+    const Json::Value got = Parse(made.out);
+    const std::string id = got["id"].asString();
+    EXPECT_EQ(101u, id.size());
+    EXPECT_EQ(std::string::npos, id.find_first_not_of("0123456789ABCDEF", 5)) << id;
+    EXPECT_EQ(0u, id.rfind("1001_", 0)) << id;
+    const std::string version = got["version"].asString();
+    EXPECT_EQ(40u, version.size());
+    EXPECT_EQ(std::string::npos, version.find_first_not_of("0123456789abcdef")) << version;
+    Json::Value expected = Parse(R"({"acl": {}, "category": "note", "commit_msg": {"message": "first"},
+        "binary_info": {"list.txt": {"format": "raw", "md5": "eeb706fc81a6ee6a2a0fa7b96d33cecc", "name": "list.txt"}},
+        "metabinary_info": {}, "metatext": {}, "ns": "notes", "owner": {"display_name": "alice", "uid": 1001},
+        "parent_id": "1001_#00000000", "perm": "owner", "person": {}, "text": {"title": "Shopping"}})");
+    for (const char *key : {"id", "version", "ctime", "mtime"}) {
+        expected[key] = got[key];
+    }
+    expected["binary_info"]["list.txt"]["auto_mtime"] = got["binary_info"]["list.txt"]["auto_mtime"];
+    EXPECT_EQ(expected, got);
+    EXPECT_EQ(got["ctime"], got["mtime"]);
+    const std::vector<std::string> stored = {id};
+    EXPECT_EQ(stored, Entries("/volume2/@Tessel/notes"));
+
+    // Refused by the library: the identifier is taken; the object is as it was.
+    Result taken = Tessel({"--as", "alice", "create", "--ns", "notes", "--category", "note", "--id", id, "--text",
+                           "title=Other"});
+    EXPECT_EQ(1, taken.code);
+    EXPECT_EQ("", taken.out);
+    EXPECT_EQ("tessel call stack:\n"
+              "  !PrepareCreateParm(jParm) (object/list_object_create)\n"
+              "  TesselIDIsExist(jParm[\"ns\"].asString(), jParm[\"id\"].asString()) (object/list_object_create)\n"
+              "  ErrNo=[1031] (Object ID already exists.)\n",
+              taken.err);
+    // Refused by the tool: alice cannot read the file she names, so nothing reaches the store.
+    Result secret = Tessel({"--as", "alice", "create", "--ns", "notes", "--category", "note", "--binary",
+                            "s.txt=" + dir.file("secret.txt")});
+    EXPECT_EQ(2, secret.code);
+    EXPECT_EQ(ToolStack("cannot read " + dir.file("secret.txt") + " as a regular file",
+                        "ErrNo=[1002] (Open File failed.)") + "Try 'tessel create --help'.\n",
+              secret.err);
+    // bob cannot create under alice's object.
+    Result child = Tessel({"--as", "bob", "create", "--ns", "notes", "--category", "note", "--parent", id});
+    EXPECT_EQ(1, child.code);
+    EXPECT_EQ("", child.out);
+    EXPECT_EQ(stored, Entries("/volume2/@Tessel/notes"));
+    std::vector<std::string> scratch;
+    for (const std::string &name : Entries("/tmp")) {
+        if (0 == name.rfind("tessel-attach-", 0)) {
+            scratch.push_back(name);
+        }
+    }
+    EXPECT_EQ(std::vector<std::string>(), scratch);
+    Result read = Tessel({"--as", "alice", "get", "--ns", "notes", "--id", id});
+    ASSERT_EQ(0, read.code) << read.err;
+    Json::Value again = Parse(read.out);
+    expected.removeMember("person");  // a read shows persons only when asked for them
+    EXPECT_EQ(expected, again);
+}
+
+TEST_F(TesselCli, SetMakesVersionsOnTheLatestAndARefusedSetChangesNothing) {
+    ASSERT_NO_FATAL_FAILURE(PlaceNotes());
+    Result made = Tessel({"--as", "alice", "create", "--ns", "notes", "--category", "note", "--text", "title=Shopping",
+                          "--text", "body=Milk"});
+    ASSERT_EQ(0, made.code) << made.err;
+    const Json::Value first = Parse(made.out);
+    const std::string id = first["id"].asString();
+
+    Result edit = Tessel({"--as", "alice", "--compact", "set", "--ns", "notes", "--id", id, "--text", "body=Eggs",
+                          "--delete-text", "title", "--commit-msg", "eggs"});
+    ASSERT_EQ(0, edit.code) << edit.err;
+    const Json::Value second = Parse(edit.out);
+    EXPECT_EQ(Parse(R"({"body": "Eggs"})"), second["text"]);
+    EXPECT_EQ(Parse(R"({"message": "eggs"})"), second["commit_msg"]);
+    EXPECT_NE(first["version"], second["version"]);
+    EXPECT_EQ(first["ctime"], second["ctime"]);
+
+    // bob has no permission on alice's unshared note: refused, nothing changes.
+    Result bob = Tessel({"--as", "bob", "set", "--ns", "notes", "--id", id, "--text", "body=Bob's"});
+    EXPECT_EQ(1, bob.code);
+    EXPECT_EQ("", bob.out);
+    EXPECT_NE(std::string::npos, bob.err.find("  ErrNo=[1020] (Sharing is not enabled for the object.)\n")) << bob.err;
+    Result wrong = Tessel({"--as", "alice", "set", "--ns", "notes", "--id", id, "--text", "body"});
+    EXPECT_EQ(2, wrong.code);
+    EXPECT_EQ(0u, wrong.err.find(ToolStack("--text needs NAME=VALUE: body", "ErrNo=[1007] (User input error.)")))
+        << wrong.err;
+
+    Result versions = Tessel({"--as", "alice", "versions", "list", "--ns", "notes", "--id", id});
+    ASSERT_EQ(0, versions.code) << versions.err;
+    const Json::Value list = Parse(versions.out);
+    EXPECT_EQ(2, list["total"].asInt());
+    std::set<std::string> names;
+    for (const Json::Value &v : list["versions"]) {
+        names.insert(v["version"].asString());
+    }
+    EXPECT_EQ((std::set<std::string>{first["version"].asString(), second["version"].asString()}), names);
+    Result now = Tessel({"--as", "alice", "--compact", "get", "--ns", "notes", "--id", id});
+    ASSERT_EQ(0, now.code);
+    Json::Value shown = second;
+    shown.removeMember("person");
+    EXPECT_EQ(shown, Parse(now.out));
 }
 
 }  // namespace
