@@ -9,6 +9,7 @@
 // (one command line)
 #include <stdlib.h>
 
+#include <filesystem>
 #include <memory>
 #include <string>
 #include <vector>
@@ -40,7 +41,8 @@ Json::Value Text(const std::string &strText) {
     return jVal;
 }
 
-// 300 objects of alice, shared with bob, with meta-text and a person summary.
+// 300 objects of alice, shared with bob, with meta-text, a person summary and
+// three text fields in a first commit.
 bool LayOut() {
     if (!g_ids.empty()) {
         return true;
@@ -54,10 +56,13 @@ bool LayOut() {
         return false;
     }
     std::unique_ptr<TESSEL_BACKEND_OP> pFs(RegisterBackend::New("fs"));
-    Json::Value jParm = Text(R"({"ns": "ledger", "owner": 1001, "category": "note", "parent_id": "", "ctime": 100,
+    Json::Value jParm = Text(R"({"ns": "ledger", "owner": 1001, "requester": 1001, "category": "note",
+                                 "parent_id": "", "ctime": 100, "mtime": 200,
                                  "acl": {"enabled": true, "zem_user": {"1002": {"perm": "ro"}}},
                                  "metatext": {"title": "a title", "tags": ["x", "y", "z"], "size": 12345},
-                                 "person": {"summary": {"count": 1}}})");
+                                 "person": {"summary": {"count": 1}},
+                                 "text": {"title": "Quarterly report", "tags": ["finance", "q3"]}})");
+    jParm["text"]["body"] = std::string(400, 'x');
     for (int i = 0; i < kObjects; ++i) {
         std::string strId, strVer;
         if (!pFs->Create(jParm, strId, strVer)) {
@@ -92,8 +97,8 @@ void BM_GetById(benchmark::State &state) {
     const Json::Value jParm = Request(kBob, g_ids[0]);
     TESSEL_OBJECT obj;
     for (auto _ : state) {
-        if (!obj.Get(jParm)) {
-            state.SkipWithError("get failed");
+        if (!obj.Get(jParm) || obj.get_ref_version().empty() || obj.get_ref_text().size() != 3) {
+            state.SkipWithError("get failed or read no version");
             return;
         }
         benchmark::DoNotOptimize(obj.get_ref_metatext());
@@ -102,7 +107,8 @@ void BM_GetById(benchmark::State &state) {
 BENCHMARK(BM_GetById);
 
 // The same files read directly: the object's basic and meta-text files, its
-// person summary, and the head commit of its repository when it has one.
+// person summary, its text fields in the repository's work tree and the head
+// commit (with its message, author and time, which a get reports).
 void BM_RawReadBaseline(benchmark::State &state) {
     if (!LayOut()) {
         state.SkipWithError("cannot lay out objects (run inside the sandbox)");
@@ -115,13 +121,30 @@ void BM_RawReadBaseline(benchmark::State &state) {
         ReadJsonFile(strBase + "/basic.json", jBasic);
         ReadJsonFile(strBase + "/metatext.json", jMeta);
         ReadJsonFile(strBase + "/person/summary.json", jSummary);
-        git_repository *pRepo = nullptr;
-        if (0 == git_repository_open_ext(&pRepo, (strBase + "/version").c_str(), GIT_REPOSITORY_OPEN_NO_SEARCH,
-                                         nullptr)) {
-            git_oid oid;
-            git_reference_name_to_id(&oid, pRepo, "HEAD");
-            git_repository_free(pRepo);
+        // Every field file of the work tree (their names are encoded).
+        std::vector<std::string> vText;
+        for (const auto &entry : std::filesystem::directory_iterator(strBase + "/version/text")) {
+            vText.push_back(tessel_test::ReadFile(entry.path().string()));
         }
+        git_repository *pRepo = nullptr;
+        if (0 != git_repository_open_ext(&pRepo, (strBase + "/version").c_str(), GIT_REPOSITORY_OPEN_NO_SEARCH,
+                                         nullptr)) {
+            state.SkipWithError("no repository");
+            return;
+        }
+        git_oid oid;
+        git_commit *pCommit = nullptr;
+        if (0 != git_reference_name_to_id(&oid, pRepo, "HEAD") || 0 != git_commit_lookup(&pCommit, pRepo, &oid) ||
+            vText.size() != 3) {
+            git_repository_free(pRepo);
+            state.SkipWithError("no head commit or no text");
+            return;
+        }
+        std::string strMsg = git_commit_message(pCommit);
+        benchmark::DoNotOptimize(strMsg);
+        benchmark::DoNotOptimize(git_commit_time(pCommit));
+        git_commit_free(pCommit);
+        git_repository_free(pRepo);
         benchmark::DoNotOptimize(jMeta);
     }
     git_libgit2_shutdown();
