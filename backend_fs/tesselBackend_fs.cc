@@ -40,11 +40,20 @@ const RegisterBackend g_registerFs("fs", CreateFsBackend);
 }  // namespace
 
 TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
-    // The version store assumes libgit2 is up while a backend exists.
-    git_libgit2_init();
-    // Each repository belongs to its object's owner while the store works on
-    // it as root; libgit2 would refuse such a repository as someone else's.
-    git_libgit2_opts(GIT_OPT_SET_OWNER_VALIDATION, 0);
+    // The version store assumes libgit2 is up while a backend exists. It is
+    // brought up once for the process and left up: every operation makes a
+    // store of its own, and bringing libgit2 up from nothing (its TLS set-up
+    // reads and decodes the system's certificates) cost more than the whole
+    // read the store was made for.
+    static const bool s_blGitUp = [] {
+        git_libgit2_init();
+        // Each repository belongs to its object's owner while the store works
+        // on it as root; libgit2 would refuse such a repository as someone
+        // else's.
+        git_libgit2_opts(GIT_OPT_SET_OWNER_VALIDATION, 0);
+        return true;
+    }();
+    (void)s_blGitUp;
     // The table is compiled in; a parse failure is a build defect, reported
     // here and seen as an empty table (no field read or saved) afterwards.
     if (!tessel::FsParseFieldTable(m_jFieldTable, m_fieldOrder)) {
@@ -53,7 +62,7 @@ TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
     }
 }
 
-TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() { git_libgit2_shutdown(); }
+TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() = default;
 
 // ---- questions for the index store ------------------------------------------
 
