@@ -157,20 +157,35 @@ namespace tessel {
 const char *FsFieldTableText() { return kFieldTable; }
 
 bool FsParseFieldTable(Json::Value &jTable, std::vector<std::string> &order) {
-    const std::string strText = kFieldTable;
-    TESSEL_CHECK(!fromString(jTable, strText) || !jTable.isObject(), TESSEL_ERR_UNEXPECTED,
-                 "!jTable.fromString(kFieldTable)", false);
-    // Each name's place in the text, found once: every store made for an
-    // operation does this, so it must stay cheap.
-    std::vector<std::pair<size_t, std::string>> places;
-    for (const std::string &strName : jTable.getMemberNames()) {
-        places.emplace_back(strText.find("\"" + strName + "\":["), strName);
-    }
-    std::sort(places.begin(), places.end());
-    order.clear();
-    for (auto &place : places) {
-        order.push_back(std::move(place.second));
-    }
+    // The text is compiled in, so it is parsed once for the process; every
+    // store made for an operation takes a copy, which costs a fraction of
+    // parsing it again.
+    struct Parsed {
+        bool blOk = false;
+        Json::Value jTable;
+        std::vector<std::string> order;
+    };
+    static const Parsed s_parsed = [] {
+        Parsed parsed;
+        const std::string strText = kFieldTable;
+        if (!fromString(parsed.jTable, strText) || !parsed.jTable.isObject()) {
+            return parsed;
+        }
+        // The names in the order the text gives them.
+        std::vector<std::pair<size_t, std::string>> places;
+        for (const std::string &strName : parsed.jTable.getMemberNames()) {
+            places.emplace_back(strText.find("\"" + strName + "\":["), strName);
+        }
+        std::sort(places.begin(), places.end());
+        for (auto &place : places) {
+            parsed.order.push_back(std::move(place.second));
+        }
+        parsed.blOk = true;
+        return parsed;
+    }();
+    TESSEL_CHECK(!s_parsed.blOk, TESSEL_ERR_UNEXPECTED, "!jTable.fromString(kFieldTable)", false);
+    jTable = s_parsed.jTable;
+    order = s_parsed.order;
     return true;
 }
 
