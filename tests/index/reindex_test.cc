@@ -1,9 +1,10 @@
 // Emptying and rebuilding the index against the sandbox's server, with real
 // objects laid out by the file-system store in namespaces "ledger" (filter:
 // meta-text member "hidden" and text members starting with tmp_ stay out)
-// and "other". Every insert
-// statement the server runs is counted by a statement trigger of the test's
-// own, so batch sizes are seen from the server's side.
+// and "other"; each object has text committed into its repository, so
+// version, commit message and modification time come from its history. Every
+// insert statement the server runs is counted by a statement trigger of the
+// test's own, so batch sizes are seen from the server's side.
 #include <sys/stat.h>
 #include <syslog.h>
 
@@ -82,16 +83,38 @@ protected:
         ErrClear();
     }
 
-    // A stored object of alice's; returns its id.
+    // A stored object of alice's, its first version committed at 1700000000 + n
+    // with text "title" and "tmp_draft"; returns its id.
     std::string Create(const std::string &ns, int n) {
         Json::Value jParm = Parse(R"({"owner": 1001, "requester": 1001, "ctime": 1700000000,
-                                      "acl": {"enabled": false}, "metatext": {"m": 2, "hidden": 1}})");
+                                      "acl": {"enabled": false}, "metatext": {"m": 2, "hidden": 1},
+                                      "commit_msg": {"note": "first"}})");
         jParm["ns"] = ns;
         jParm["category"] = "c" + std::to_string(n);
+        jParm["mtime"] = 1700000000 + n;
+        jParm["text"]["title"] = "note " + std::to_string(n);
+        jParm["text"]["tmp_draft"] = n;
         std::string strId, strVer;
         EXPECT_TRUE(fs_->Create(jParm, strId, strVer)) << ::testing::PrintToString(ErrMsgs());
+        EXPECT_EQ(40u, strVer.size());
         versions_[strId] = strVer;
         return strId;
+    }
+
+    // What the store holds of an object's versioned fields.
+    Json::Value Stored(const std::string &ns, const std::string &strId) {
+        Json::Value jParm = Parse(R"({"requester": 1001, "owner": 1001,
+                                      "field": {"text": true, "commit_msg": true}})");
+        jParm["ns"] = ns;
+        jParm["id"] = strId;
+        TESSEL_OBJECT obj;
+        EXPECT_TRUE(fs_->Get(jParm, &obj)) << ::testing::PrintToString(ErrMsgs());
+        Json::Value jRet(Json::objectValue);
+        jRet["text"] = obj.get_text();
+        jRet["version"] = obj.get_version();
+        jRet["commit_msg"] = obj.get_commit_msg();
+        jRet["mtime"] = (Json::Int64)obj.get_mtime();
+        return jRet;
     }
 
     std::unique_ptr<TESSEL_BACKEND_OP> fs_{RegisterBackend::New("fs")};
@@ -166,15 +189,16 @@ TEST_F(ReindexTest, ReindexRebuildsWhatTheStoreHoldsInBatchesOfThirtyAndSkipsWha
     EXPECT_EQ(Table({{"61", "61"}}),
               Rows("SELECT count(*), count(p.id) FROM object o LEFT JOIN person p USING (id) WHERE ns = 'ledger'"));
 
-    // One row column by column: what the store holds, metatext through the filter.
+    // One row column by column: what the store holds, text and metatext
+    // through the filter.
     const std::string strId = ledger[7];
-    TESSEL_OBJECT stored;
-    ASSERT_TRUE(fs_->Get(Parse(R"({"ns": "ledger", "id": ")" + strId + R"(", "requester": 1001, "owner": 1001,
-                                  "field": {"commit_msg": true}})"),
-                         &stored));
-    const std::string strCommit = stored.get_commit_msg().empty() ? "{}" : Compact(stored.get_commit_msg());
-    EXPECT_EQ(Table({{strId, "ledger", "1001", "c7", "", versions_[strId], strCommit, R"({"enabled":false})", "{}",
-                      R"({"m":2})", "{}", "{}", "1700000000", std::to_string(stored.get_mtime()), "{}"}}),
+    const Json::Value jStored = Stored("ledger", strId);
+    EXPECT_EQ(Parse(R"({"text": {"title": "note 7", "tmp_draft": 7}, "commit_msg": {"note": "first"},
+                        "mtime": 1700000007, "version": ")" + versions_[strId] + "\"}"),
+              jStored);
+    EXPECT_EQ(Table({{strId, "ledger", "1001", "c7", "", versions_[strId], Compact(jStored["commit_msg"]),
+                      R"({"enabled":false})", R"({"title":"note 7"})", R"({"m":2})", "{}", "{}", "1700000000",
+                      jStored["mtime"].asString(), "{}"}}),
               Rows(std::string(kObjectColumns) + " WHERE id = '" + strId + "'"));
     const std::string strLedgerRows = std::string(kObjectColumns) + " WHERE ns = 'ledger' ORDER BY id";
     const Table snapshot = Rows(strLedgerRows);
@@ -202,15 +226,35 @@ TEST_F(ReindexTest, ReindexRebuildsWhatTheStoreHoldsInBatchesOfThirtyAndSkipsWha
                      {"person", "1"}, {"object", "1"}, {"person", "1"}}),
               Rows("SELECT tbl, nrows FROM insert_log ORDER BY seq"));
     EXPECT_EQ(snapshot, Rows(strLedgerRows));
-    EXPECT_EQ(Table({{strOther, "other", "c100"}}), Rows("SELECT id, ns, category FROM object WHERE ns <> 'ledger'"));
+    // Namespace "other" has no filter: its text keeps every member.
+    EXPECT_EQ(Table({{strOther, "other", "c100", R"({"title":"note 100","tmp_draft":100})", "1700000100"}}),
+              Rows("SELECT id, ns, category, text, mtime FROM object WHERE ns <> 'ledger'"));
     EXPECT_EQ(Table({{"62"}}), Rows("SELECT count(*) FROM person"));
 }
 
 TEST_F(ReindexTest, IndexingByIdReadsTheStoredObject) {
     const std::string strId = Create("ledger", 1);
+    const std::string kVersioned = "SELECT id, category, metatext, version, commit_msg, text, mtime FROM object";
     ASSERT_TRUE(TesselObjectIndex(strId.c_str(), "ledger", 1001));
-    EXPECT_EQ(Table({{strId, "c1", R"({"m":2})"}}), Rows("SELECT id, category, metatext FROM object"));
+    EXPECT_EQ(Table({{strId, "c1", R"({"m":2})", versions_[strId], R"({"note":"first"})", R"({"title":"note 1"})",
+                      "1700000001"}}),
+              Rows(kVersioned));
     EXPECT_EQ(Table({{strId}}), Rows("SELECT id FROM person"));
+
+    // A second version: the row follows the store to its latest commit.
+    Json::Value jSet = Parse(R"({"ns": "ledger", "requester": 1001, "mtime": 1700000500,
+                                 "text": {"title": "note one", "body": "b", "tmp_draft": null},
+                                 "commit_msg": {"note": "second"}})");
+    jSet["id"] = strId;
+    jSet["version"] = versions_[strId];
+    std::string strVer2;
+    ASSERT_TRUE(fs_->Set(jSet, strVer2)) << ::testing::PrintToString(ErrMsgs());
+    ASSERT_NE(versions_[strId], strVer2);
+    EXPECT_EQ(strVer2, Stored("ledger", strId)["version"].asString());
+    ASSERT_TRUE(TesselObjectIndex(strId.c_str(), "ledger", 1001));
+    EXPECT_EQ(Table({{strId, "c1", R"({"m":2})", strVer2, R"({"note":"second"})",
+                      R"({"body":"b","title":"note one"})", "1700000500"}}),
+              Rows(kVersioned));
 
     // The parameter's own object is upserted once more after the namespace:
     // its insert statements find the row there and add none.
@@ -218,7 +262,9 @@ TEST_F(ReindexTest, IndexingByIdReadsTheStoredObject) {
     ASSERT_TRUE(TesselReindex(Parse("{\"ns\": \"ledger\", \"id\": \"" + strId + "\"}")));
     EXPECT_EQ(Table({{"object", "1"}, {"person", "1"}, {"object", "0"}, {"person", "0"}}),
               Rows("SELECT tbl, nrows FROM insert_log ORDER BY seq"));
-    EXPECT_EQ(Table({{strId, "c1"}}), Rows("SELECT id, category FROM object"));
+    EXPECT_EQ(Table({{strId, "c1", R"({"m":2})", strVer2, R"({"note":"second"})", R"({"body":"b","title":"note one"})",
+                      "1700000500"}}),
+              Rows(kVersioned));
 
     const std::string strMissing = "1001_" + std::string(96, '0');
     ErrClear();
