@@ -40,11 +40,13 @@ const RegisterBackend g_registerFs("fs", CreateFsBackend);
 }  // namespace
 
 TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
-    // The version store assumes libgit2 is up while a backend exists. It is
-    // brought up once for the process and left up: every operation makes a
-    // store of its own, and bringing libgit2 up from nothing (its TLS set-up
+    // Every store brings libgit2 up and takes it down again, so the version
+    // store may assume it is up while a store exists. One reference more is
+    // taken for the whole process and never given back: each operation makes
+    // a store of its own, and bringing libgit2 up from nothing (its TLS set-up
     // reads and decodes the system's certificates) cost more than the whole
-    // read the store was made for.
+    // read the store was made for. With that reference held, the pair below
+    // only counts.
     static const bool s_blGitUp = [] {
         git_libgit2_init();
         // Each repository belongs to its object's owner while the store works
@@ -54,6 +56,7 @@ TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
         return true;
     }();
     (void)s_blGitUp;
+    git_libgit2_init();
     // The table is compiled in; a parse failure is a build defect, reported
     // here and seen as an empty table (no field read or saved) afterwards.
     if (!tessel::FsParseFieldTable(m_jFieldTable, m_fieldOrder)) {
@@ -62,7 +65,7 @@ TESSEL_BACKEND_FS::TESSEL_BACKEND_FS() {
     }
 }
 
-TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() = default;
+TESSEL_BACKEND_FS::~TESSEL_BACKEND_FS() { git_libgit2_shutdown(); }
 
 // ---- questions for the index store ------------------------------------------
 

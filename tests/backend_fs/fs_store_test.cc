@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include <git2.h>
 #include <gtest/gtest.h>
 
 #include "common/tessel_json.h"
@@ -278,3 +279,25 @@ TEST_F(FsStore, DeleteRemovesTheObjectDirectoryAndNothingElse) {
 }
 
 }  // namespace
+
+// libgit2 counts its users: each store is one while it exists, and the count
+// falls back when the store goes, so stores made and deleted by the thousand
+// never leave libgit2 up or down behind an unrelated user's back.
+TEST(FsStoreLibgit2, EachStoreHoldsOneReferenceWhileItExists) {
+    auto depth = [] {
+        int n = git_libgit2_init();
+        git_libgit2_shutdown();
+        return n - 1;
+    };
+    std::unique_ptr<TESSEL_BACKEND_OP>(RegisterBackend::New("fs"));  // the process's own reference
+    const int before = depth();
+    {
+        std::unique_ptr<TESSEL_BACKEND_OP> first(RegisterBackend::New("fs"));
+        ASSERT_NE(first, nullptr);
+        EXPECT_EQ(depth(), before + 1);
+        std::unique_ptr<TESSEL_BACKEND_OP> second(RegisterBackend::New("fs"));
+        EXPECT_EQ(depth(), before + 2);
+    }
+    EXPECT_EQ(depth(), before);
+    EXPECT_GE(before, 1) << "libgit2 stays up for the process between stores";
+}
