@@ -11,6 +11,7 @@
 #include "common/tessel_report.h"
 #include "object/object_create.h"
 #include "object/object_ops.h"
+#include "object/object_upload.h"
 #include "tessel_backend.h"
 #include "tessel_conf.h"
 #include "tessel_hook.h"
@@ -159,7 +160,11 @@ bool PrepareCreateParm(Json::Value &jParm) {
     }
     TESSEL_CHECK_APPEND(FALSE == TesselObjectOwnerIsValid(owner),
                         "FALSE == TesselObjectOwnerIsValid((uid_t)jParm[\"owner\"].asInt64())", false);
-    return CompleteFields(jParm);
+    if (!CompleteFields(jParm)) {
+        return false;
+    }
+    TESSEL_CHECK_APPEND(!tessel::CheckUploadSources(jParm), "!CheckUploadSources(jParm)", false);
+    return true;
 }
 
 namespace {

@@ -11,6 +11,7 @@
 #include "common/tessel_priv.h"
 #include "common/tessel_report.h"
 #include "object/object_ops.h"
+#include "object/object_upload.h"
 #include "object/object_set.h"
 #include "tessel_backend.h"
 #include "tessel_conf.h"
@@ -193,9 +194,10 @@ bool PrepareSetParm(Json::Value &jParm, const Json::Value &oldAcl, TESSEL_OBJECT
                  "!jParm[\"binary_files\"].isArray()", false);
     TESSEL_CHECK(jParm.isMember("commit_msg") && !jParm["commit_msg"].isObject(), TESSEL_ERR_USER_INPUT,
                  "!jParm[\"commit_msg\"].isObject()", false);
-    if (jParm.isMember("parent_id") || jParm.isMember("reset_parent_id")) {
-        return PrepareParent(jParm, oldAcl);
+    if ((jParm.isMember("parent_id") || jParm.isMember("reset_parent_id")) && !PrepareParent(jParm, oldAcl)) {
+        return false;
     }
+    TESSEL_CHECK_APPEND(!tessel::CheckUploadSources(jParm), "!CheckUploadSources(jParm)", false);
     return true;
 }
 
