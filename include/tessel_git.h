@@ -4,7 +4,9 @@
  * is the local branch tip with the greatest commit time. Versions are 40-digit
  * lower-case commit identifiers. Each function returns 0 (GitListCommitHistory:
  * a count) or the negative libgit2 result (-1), with 1008 on the error stack
- * for something not found and 1037 for any other Git failure.
+ * for something not found and 1037 for any other Git failure. A null argument
+ * is refused with 1015 "bad parameter", and a path of a change table of 4095
+ * characters or more with 1007 "strlen(szPath) >= 4095".
  *
  * The add table maps a repository path to a file on disk whose content it
  * gets; the delete table names repository paths to remove; the rename table

@@ -1,7 +1,7 @@
 /*
  * tessel namespace ...: where a namespace keeps its objects. An application's
  * installer places its namespace once (a folder on the volume of its package,
- * or of the homes share, and the link to it); reads and writes find it there.
+ * and the link to it); reads and writes find it there.
  */
 #include <tessel/tessel.h>
 
@@ -56,7 +56,8 @@ int Path(Context &ctx, const Command &cmd, const Args &args) {
 void AddNamespaceCommands(std::vector<Command> &t) {
     t.push_back({"namespace create", "--ns NS [--pkg ID]", "give a namespace its folder (once, by its installer)",
                  "The folder goes to the volume of the package's target (--pkg, else the package\n"
-                 "named for the namespace in the settings), else to the volume of the homes share.",
+                 "named for the namespace in the settings); with neither, the namespace cannot be\n"
+                 "placed. Where volumes cannot move, every namespace lives on the homes share's volume.",
                  {{"ns", "NS", "the namespace (required)"}, {"pkg", "ID", "the application package"}}, 0, 0,
                  Place});
     t.push_back({"namespace path", "--ns NS", "the folder that holds the namespace's objects", "",
