@@ -80,7 +80,11 @@ size_t SyslogMark() {
 
 std::vector<SyslogLine> SyslogSince(size_t mark) {
     std::vector<SyslogLine> lines;
-    std::istringstream text(ReadLogFrom(mark));
+    std::string log = ReadLogFrom(mark);
+    // The daemon may be half-way through writing the last line: only whole
+    // lines count, the rest is read again on the next look.
+    log.erase(log.find_last_of('\n') == std::string::npos ? 0 : log.find_last_of('\n') + 1);
+    std::istringstream text(log);
     std::string raw;
     while (std::getline(text, raw)) {
         lines.push_back(Parse(raw));
