@@ -13,17 +13,15 @@
 #include <sys/stat.h>
 
 #include <filesystem>
-#include <memory>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include <benchmark/benchmark.h>
 #include <git2.h>
-#include <json/reader.h>
-#include <json/writer.h>
 #include <libpq-fe.h>
 
+#include "bench/bench_support.h"
 #include "bench/git_baseline.h"
 #include "tessel_id.h"
 #include "tesselobject.h"
@@ -31,25 +29,14 @@
 namespace {
 
 namespace fs = std::filesystem;
+using tessel_bench::Compact;
+using tessel_bench::Parse;
+using tessel_bench::WriteWhole;
 
 const std::string kNs = "bench";
 const std::string kNsDir = "/volume1/@Tessel/bench";
 constexpr unsigned kAlice = 1001;
 constexpr long long kMtime = 1700000000;
-
-Json::Value Parse(const std::string &strText) {
-    Json::CharReaderBuilder builder;
-    std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-    Json::Value jVal;
-    reader->parse(strText.data(), strText.data() + strText.size(), &jVal, nullptr);
-    return jVal;
-}
-
-std::string Compact(const Json::Value &jVal) {
-    Json::StreamWriterBuilder builder;
-    builder["indentation"] = "";
-    return Json::writeString(builder, jVal);
-}
 
 // A dozen text fields of a few words each, the same for both sides.
 Json::Value Text(int round) {
@@ -71,16 +58,9 @@ std::vector<std::pair<std::string, std::string>> Fields(const Json::Value &jText
 
 bool Setup() {
     static const bool blDone = [] {
-        FILE *pConf = fopen("/usr/quor/etc/tessel.conf", "w");
-        if (nullptr == pConf) {
+        if (!tessel_bench::PlaceBenchNamespace()) {
             return false;
         }
-        fputs(R"({"Access":{"enable":true,"enable_ns_bench":true}})", pConf);
-        fclose(pConf);
-        std::error_code ec;
-        fs::create_directories(kNsDir, ec);
-        fs::create_directories("/usr/quor/etc/tessel/ns", ec);
-        fs::create_directory_symlink(kNsDir, "/usr/quor/etc/tessel/ns/" + kNs, ec);
         // One object through the library makes the index database.
         TESSEL_OBJECT obj;
         return obj.Create(Parse(R"({"ns": "bench", "requester": 1001, "category": "note"})"));
@@ -138,15 +118,6 @@ private:
     }
     PGconn *m_conn;
 };
-
-bool WriteWhole(const std::string &strPath, const std::string &strData) {
-    FILE *f = fopen(strPath.c_str(), "wb");
-    if (f == nullptr) {
-        return false;
-    }
-    const bool ok = fwrite(strData.data(), 1, strData.size(), f) == strData.size();
-    return fclose(f) == 0 && ok;
-}
 
 std::string HeadOf(const std::string &strRepo) {
     git_repository *repo = nullptr;

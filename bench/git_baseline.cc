@@ -4,7 +4,8 @@
 // small file). What the store adds on top shows as the difference.
 #include "bench/git_baseline.h"
 
-#include <stdio.h>
+#include "bench/bench_support.h"
+
 #include <sys/stat.h>
 
 #include <string>
@@ -14,15 +15,6 @@
 namespace tessel_bench {
 
 namespace {
-
-bool WriteWhole(const std::string &strPath, const std::string &strData) {
-    FILE *f = fopen(strPath.c_str(), "wb");
-    if (f == nullptr) {
-        return false;
-    }
-    const bool ok = fwrite(strData.data(), 1, strData.size(), f) == strData.size();
-    return fclose(f) == 0 && ok;
-}
 
 // Writes the fields into <repo>/text and returns the tree of "text/<name>" entries
 // on top of base (null: an empty tree).

@@ -18,10 +18,9 @@
 #include <vector>
 
 #include <benchmark/benchmark.h>
-#include <json/reader.h>
-#include <json/writer.h>
 #include <libpq-fe.h>
 
+#include "bench/bench_support.h"
 #include "tessel_backend.h"
 #include "tessel_index.h"
 #include "tesselobject.h"
@@ -29,26 +28,14 @@
 namespace {
 
 namespace fs = std::filesystem;
+using tessel_bench::Parse;
+
+// The records' text goes to the server with non-ASCII characters unescaped.
+std::string Compact(const Json::Value &jVal) { return tessel_bench::Compact(jVal, true); }
 
 const std::string kNs = "bench";
 const std::string kRepo = "/volume1/@Tessel";
-const std::string kLinks = "/usr/quor/etc/tessel/ns";
 constexpr int kReindexObjects = 10000;
-
-Json::Value Parse(const std::string &strText) {
-    Json::CharReaderBuilder builder;
-    std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-    Json::Value jVal;
-    reader->parse(strText.data(), strText.data() + strText.size(), &jVal, nullptr);
-    return jVal;
-}
-
-std::string Compact(const Json::Value &jVal) {
-    Json::StreamWriterBuilder builder;
-    builder["indentation"] = "";
-    builder["emitUTF8"] = true;
-    return Json::writeString(builder, jVal);
-}
 
 // A record of a typical size: a dozen text fields, an acl, a person record.
 TESSEL_OBJECT *Record(const std::string &id) {
@@ -75,17 +62,7 @@ TESSEL_OBJECT *Record(const std::string &id) {
 
 bool Setup() {
     static bool blDone = [] {
-        FILE *pConf = fopen("/usr/quor/etc/tessel.conf", "w");
-        if (nullptr == pConf) {
-            return false;
-        }
-        fputs(R"({"Access":{"enable":true,"enable_ns_bench":true}})", pConf);
-        fclose(pConf);
-        std::error_code ec;
-        fs::create_directories(kRepo + "/" + kNs, ec);
-        fs::create_directories(kLinks, ec);
-        fs::create_directory_symlink(kRepo + "/" + kNs, kLinks + "/" + kNs, ec);
-        return nullptr != TesselOpenConn();
+        return tessel_bench::PlaceBenchNamespace() && nullptr != TesselOpenConn();
     }();
     return blDone;
 }

@@ -20,6 +20,7 @@
 #include <git2.h>
 #include <linux/magic.h>
 
+#include "bench/bench_support.h"
 #include "bench/git_baseline.h"
 #include "common/tessel_json.h"
 #include "common/tessel_priv.h"
@@ -36,6 +37,7 @@ const std::string kWorkDir = "/volume1/bench-work";
 const long long kT0 = 1700000000;
 
 using Fields = std::vector<std::pair<std::string, std::string>>;
+using tessel_bench::WriteWhole;
 
 // The framework runs each benchmark several times; names made from this stay
 // unique over all the runs of the program.
@@ -203,15 +205,6 @@ void BM_StoreList100(benchmark::State &state) {
 BENCHMARK(BM_StoreList100);
 
 // ---- the Git layer alone ----------------------------------------------------------
-
-bool WriteWhole(const std::string &strPath, const std::string &strData) {
-    FILE *f = fopen(strPath.c_str(), "wb");
-    if (f == nullptr) {
-        return false;
-    }
-    const bool ok = fwrite(strData.data(), 1, strData.size(), f) == strData.size();
-    return fclose(f) == 0 && ok;
-}
 
 // Writes the fields below strDir/text and names them in a new add table.
 QLIBSZHASH *StageFields(const std::string &strDir, const Fields &fields) {
