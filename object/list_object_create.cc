@@ -133,12 +133,7 @@ bool TESSEL_OBJECT_LIST::Create(const Json::Value &jParm, Json::Value &jsResult)
     TESSEL_LOCKER locker;
     TESSEL_CHECK_APPEND(!locker.ReadLock(TESSEL_LOCK_ALL, strNs, Json::nullValue),
                         "!locker.ReadLock(TESSEL_LOCK_ALL, jParm[\"ns\"].asString(), Json::nullValue)", false);
-    TESSEL_NS_HOOK pfnPre = NULL;
-    TESSEL_NS_HOOK pfnPost = NULL;
-    TesselNsBatchHookGet(strNs, SZ_ACTION_CREATE, &pfnPre, &pfnPost);
-    if (pfnPre) {
-        pfnPre(jParm, m_head);
-    }
+    const TESSEL_NS_HOOK pfnPost = tessel::RunPreHook(strNs, SZ_ACTION_CREATE, true, jParm, m_head);
     TESSEL_CHECK_APPEND(!doMultiThreadCreate(this), "!doMultiThreadCreate(this)", false);
 
     // The created records, in list order, and where each was copied from.

@@ -168,12 +168,7 @@ bool TESSEL_OBJECT_LIST::Set(const Json::Value &jParm, Json::Value &jsResult) {
                             "!locker.ReadLock(TESSEL_LOCK_BACKUP_OBJECT_VOLUME, jParm[\"ns\"].asString(), jParm[\"id\"])",
                             false);
     }
-    TESSEL_NS_HOOK pfnPre = NULL;
-    TESSEL_NS_HOOK pfnPost = NULL;
-    TesselNsBatchHookGet(strNs, SZ_ACTION_SET, &pfnPre, &pfnPost);
-    if (pfnPre) {
-        pfnPre(jParm, m_head);
-    }
+    const TESSEL_NS_HOOK pfnPost = tessel::RunPreHook(strNs, SZ_ACTION_SET, true, jParm, m_head);
     std::vector<bool> vecSetOk;
     TESSEL_CHECK_APPEND(!doMultiThreadSet(this, vecSetOk), "!doMultiThreadSet(this)", false);
 

@@ -131,10 +131,7 @@ bool PrepareCreateParm(Json::Value &jParm) {
             PlaceAtTopLevel(jParm, owner);
         } else {
             TESSEL_OBJECT obj;
-            Json::Value jGetParm(Json::objectValue);
-            jGetParm["ns"] = strNs;
-            jGetParm["id"] = jParm["parent_id"];
-            jGetParm["requester"] = jParm["requester"];
+            Json::Value jGetParm = tessel::ReadRequest(jParm, jParm["parent_id"]);
             jGetParm["field"]["acl"] = true;
             TESSEL_CHECK_APPEND(!obj.Get(jGetParm), "!obj.Get(jGetParm)", false);
             TESSEL_CHECK(SZ_PERM_RW != obj.get_ref_perm() && SZ_PERM_OWNER != obj.get_ref_perm(),
@@ -194,12 +191,7 @@ bool CreateOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &j
     TESSEL_LOCKER locker;
     TESSEL_CHECK_APPEND(!locker.ReadLock(TESSEL_LOCK_ALL, jParm["ns"].asString(), Json::nullValue),
                         "!locker.ReadLock(TESSEL_LOCK_ALL, jParm[\"ns\"].asString(), Json::nullValue)", false);
-    TESSEL_NS_HOOK pfnPre = NULL;
-    TESSEL_NS_HOOK pfnPost = NULL;
-    TesselNsHookGet(jParm["ns"].asString(), SZ_ACTION_CREATE, &pfnPre, &pfnPost);
-    if (pfnPre) {
-        pfnPre(jParm, NULL);
-    }
+    const TESSEL_NS_HOOK pfnPost = tessel::RunPreHook(jParm["ns"].asString(), SZ_ACTION_CREATE, false, jParm, NULL);
 
     std::string strNewID;
     std::string strNewVer;
@@ -210,11 +202,8 @@ bool CreateOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &j
     }
     TESSEL_CHECK_APPEND(!blCreated, "!pBackendFs->Create(jParm, strNewID, strNewVer)", false);
 
-    Json::Value jGetParm(Json::objectValue);
-    jGetParm["ns"] = jParm["ns"];
-    jGetParm["id"] = strNewID;
+    Json::Value jGetParm = tessel::ReadRequest(jParm, strNewID);
     jGetParm["version"] = strNewVer;
-    jGetParm["requester"] = jParm["requester"];
     jGetParm["field"] = TesselObjectFieldAll();
     TESSEL_CHECK_APPEND(!TesselSettingsIndexGetFromCache(jGetParm["ns"].asString(), jGetParm["field_filter"]),
                         "!TesselSettingsIndexGetFromCache(jGetParm[\"ns\"].asString(), jGetParm[\"field_filter\"])",

@@ -117,6 +117,29 @@ Json::Value InheritedAcl(const Json::Value &jParentAcl) {
     return jAcl;
 }
 
+Json::Value ReadRequest(const Json::Value &jParm, const Json::Value &jId) {
+    Json::Value jGetParm(Json::objectValue);
+    jGetParm["ns"] = jParm["ns"];
+    jGetParm["id"] = jId;
+    jGetParm["requester"] = jParm["requester"];
+    return jGetParm;
+}
+
+TESSEL_NS_HOOK RunPreHook(const std::string &strNs, const char *szAction, bool blBatch, const Json::Value &jParm,
+                          const TESSEL_OBJECT *pObj) {
+    TESSEL_NS_HOOK pfnPre = NULL;
+    TESSEL_NS_HOOK pfnPost = NULL;
+    if (blBatch) {
+        TesselNsBatchHookGet(strNs, szAction, &pfnPre, &pfnPost);
+    } else {
+        TesselNsHookGet(strNs, szAction, &pfnPre, &pfnPost);
+    }
+    if (pfnPre) {
+        pfnPre(jParm, pObj);
+    }
+    return pfnPost;
+}
+
 std::string PermAfterChange(const Json::Value &jParm, const TESSEL_OBJECT &obj) {
     const Json::Value jSavedStack = TesselErrMsgGet();
     std::string strPerm;

@@ -1,7 +1,8 @@
 /*
  * Pieces the changing operations on objects (create, set) share: safe reads
- * of request members, the dealing of a chain's records to worker threads,
- * and the marking of an acl taken over from a parent.
+ * of request members, the request of a read, the namespace's hooks, the
+ * dealing of a chain's records to worker threads, and the marking of an acl
+ * taken over from a parent.
  */
 #ifndef TESSEL_OBJECT_OBJECT_OPS_H
 #define TESSEL_OBJECT_OBJECT_OPS_H
@@ -12,6 +13,7 @@
 
 #include <json/value.h>
 
+#include "tessel_hook.h"
 #include "tesselobject.h"
 
 namespace tessel {
@@ -39,6 +41,16 @@ void RunDealt(TESSEL_OBJECT *pHead, const char *szModule,
 /* A parent's acl as a child takes it over: "inherit": true on "public",
  * "zem_app" and every "zem_user" and "zem_group" entry present. */
 Json::Value InheritedAcl(const Json::Value &jParentAcl);
+
+/* The request of a read of the object jId in jParm's namespace, made on
+ * behalf of jParm's requester; callers add the fields and version they need. */
+Json::Value ReadRequest(const Json::Value &jParm, const Json::Value &jId);
+
+/* Looks up the namespace's hooks for szAction (the list operations' table
+ * when blBatch), runs the "pre" one on jParm and pObj, and returns the
+ * "post" one (NULL: none). */
+TESSEL_NS_HOOK RunPreHook(const std::string &strNs, const char *szAction, bool blBatch, const Json::Value &jParm,
+                          const TESSEL_OBJECT *pObj);
 
 /* The word the requester holds on the record's object now, "NA" when it can
  * no longer be calculated (the error stack is left as it was), with "owner"

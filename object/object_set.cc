@@ -137,10 +137,7 @@ bool PrepareParent(Json::Value &jParm, const Json::Value &oldAcl) {
                      "jParm[\"parent_id\"].asString() == jParm[\"id\"].asString()", false);
         if (TesselIDIsExist(jParm["ns"].asString(), jParm["parent_id"].asString())) {
             TESSEL_OBJECT obj;
-            Json::Value jGetParm(Json::objectValue);
-            jGetParm["ns"] = jParm["ns"];
-            jGetParm["id"] = jParm["parent_id"];
-            jGetParm["requester"] = jParm["requester"];
+            Json::Value jGetParm = tessel::ReadRequest(jParm, jParm["parent_id"]);
             jGetParm["field"]["acl"] = true;
             TESSEL_CHECK_APPEND(!obj.Get(jGetParm), "!obj.Get(jGetParm)", false);
             TESSEL_CHECK(SZ_PERM_RW != obj.get_ref_perm() && SZ_PERM_OWNER != obj.get_ref_perm(),
@@ -244,13 +241,10 @@ bool SetOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &jPar
                         "FALSE == TesselObjectIDIsValid(jParm[\"id\"].asCString())", false);
 
     TESSEL_OBJECT tmpOldObj;
-    Json::Value jGetParm(Json::objectValue);
-    jGetParm["ns"] = jParm["ns"];
-    jGetParm["id"] = jParm["id"];
+    Json::Value jGetParm = tessel::ReadRequest(jParm, jParm["id"]);
     if (jParm.isMember("version")) {
         jGetParm["version"] = jParm["version"];
     }
-    jGetParm["requester"] = jParm["requester"];
     jGetParm["field"] = TesselObjectFieldAll();
     TESSEL_CHECK_APPEND(!TesselSettingsIndexGetFromCache(jGetParm["ns"].asString(), jGetParm["field_filter"]),
                         "!TesselSettingsIndexGetFromCache(jGetParm[\"ns\"].asString(), jGetParm[\"field_filter\"])",
@@ -284,12 +278,7 @@ bool SetOne(TESSEL_OBJECT &self, TESSEL_BACKEND_OP &backendFs, Json::Value &jPar
             !locker.ReadLock(TESSEL_LOCK_BACKUP_OBJECT_VOLUME, jParm["ns"].asString(), jParm["id"]),
             "!locker.ReadLock(TESSEL_LOCK_BACKUP_OBJECT_VOLUME, jParm[\"ns\"].asString(), jParm[\"id\"])", false);
     }
-    TESSEL_NS_HOOK pfnPre = NULL;
-    TESSEL_NS_HOOK pfnPost = NULL;
-    TesselNsHookGet(jParm["ns"].asString(), SZ_ACTION_SET, &pfnPre, &pfnPost);
-    if (pfnPre) {
-        pfnPre(jParm, &tmpOldObj);
-    }
+    const TESSEL_NS_HOOK pfnPost = tessel::RunPreHook(jParm["ns"].asString(), SZ_ACTION_SET, false, jParm, &tmpOldObj);
 
     std::string strNewVer;
     bool blSet = false;

@@ -5,6 +5,7 @@
 #include <string>
 
 #include "common/tessel_report.h"
+#include "object/object_ops.h"
 #include "tessel_backend.h"
 #include "tessel_conf.h"
 #include "tessel_id.h"
@@ -41,10 +42,7 @@ bool TESSEL_OBJECT_VERSION::Diff(const Json::Value &jParm, Json::Value &jDiff) {
     // The read right, checked on the newer side of the comparison: a
     // version that does not exist fails here, before anything is compared.
     TESSEL_OBJECT tmpOldObj;
-    Json::Value jGetParm(Json::objectValue);
-    jGetParm["ns"] = jParm["ns"];
-    jGetParm["id"] = jParm["id"];
-    jGetParm["requester"] = jParm["requester"];
+    Json::Value jGetParm = tessel::ReadRequest(jParm, jParm["id"]);
     if (jParm.isMember("new_version")) {
         jGetParm["version"] = jParm["new_version"];
     }
