@@ -151,6 +151,16 @@ IndexRow MakeRow(const TESSEL_OBJECT *pObj, std::string strText, std::string str
     return row;
 }
 
+// The record's row, its text and metatext narrowed by jFilter.
+bool FilteredRow(IndexRow &row, const TESSEL_OBJECT *pObj, const Json::Value &jFilter) {
+    std::string strFilterText;
+    std::string strFilterMetatext;
+    TESSEL_CHECK_APPEND(!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter),
+                        "!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter)", false);
+    row = MakeRow(pObj, std::move(strFilterText), std::move(strFilterMetatext));
+    return true;
+}
+
 // The wrapper takes C strings: a value with a NUL byte would be cut short
 // there and stored as something else, so such a row is not filled at all.
 // (JSON columns never hold one; the writer escapes it.)
@@ -206,17 +216,46 @@ SqlText FillPersonValue(const IndexRow &r) {
 // changed only on success.
 bool CreateValues(std::string &strObjectValue, std::string &strPersonValue, const TESSEL_OBJECT *pObj,
                   const Json::Value &jFilter) {
-    std::string strFilterText;
-    std::string strFilterMetatext;
-    TESSEL_CHECK_APPEND(!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter),
-                        "!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter)", false);
-    const IndexRow row = MakeRow(pObj, std::move(strFilterText), std::move(strFilterMetatext));
+    IndexRow row;
+    if (!FilteredRow(row, pObj, jFilter)) {
+        return false;
+    }
     SqlText szSQLUpsert = FillObjectValue(row);
     TESSEL_CHECK(!szSQLUpsert, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
     SqlText szSQLPerson = FillPersonValue(row);
     TESSEL_CHECK(!szSQLPerson, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
     strObjectValue = szSQLUpsert.get();
     strPersonValue = szSQLPerson.get();
+    return true;
+}
+
+// One filled upsert run on pConn; an upsert that could not be filled is refused.
+bool RunUpsert(DBConnect_tag *pConn, const SqlText &szSQLUpsert) {
+    TESSEL_CHECK(!szSQLUpsert, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
+    TESSEL_CHECK((0 != QUORDBExecute(pConn, szSQLUpsert.get(), NULL)), TESSEL_ERR_OPERATION_FAILED,
+                 "(0 != QUORDBExecute(pConn, szSQLUpsert, NULL))", false);
+    return true;
+}
+
+// jsArray as an SQL list "(a,b,...)", each element through escape; an
+// element escape leaves empty is refused with the caller's condition text.
+template <typename Escape>
+bool EscapeList(std::string &strOut, const Json::Value &jsArray, const char *szRefused, Escape escape) {
+    TESSEL_CHECK(!jsArray.isArray(), TESSEL_ERR_BAD_PARAMETERS, "!jsArray.isArray()", false);
+    if (jsArray.empty()) {
+        strOut = SZ_SQL_EMPTY_LIST;
+        return true;
+    }
+    std::string strList = "(";
+    for (Json::ArrayIndex i = 0; i < jsArray.size(); ++i) {
+        const SqlText szSQL = escape(jsArray[i]);
+        if (!szSQL) {
+            TESSEL_RAISE(TESSEL_ERR_USER_INPUT, "%s", szRefused);
+            return false;
+        }
+        strList.append(0 == i ? "" : ",").append(szSQL.get());
+    }
+    strOut = strList + ")";
     return true;
 }
 
@@ -243,21 +282,10 @@ bool TesselObjectIndexEx(DBConnect_tag *pConn, TESSEL_OBJECT *pObj) {
     Json::Value jFilter;
     TESSEL_CHECK_APPEND(!TesselSettingsIndexGetFromCache(pObj->get_ns(), jFilter),
                         "!TesselSettingsIndexGetFromCache(pObj->get_ns(), jFilter)", false);
-    std::string strFilterText;
-    std::string strFilterMetatext;
-    TESSEL_CHECK_APPEND(!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter),
-                        "!applyFilter(strFilterText, strFilterMetatext, pObj, jFilter)", false);
-    const IndexRow row = MakeRow(pObj, std::move(strFilterText), std::move(strFilterMetatext));
-
-    SqlText szSQLUpsert = FillObjectUpsert(row);
-    TESSEL_CHECK(!szSQLUpsert, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
-    TESSEL_CHECK((0 != QUORDBExecute(pConn, szSQLUpsert.get(), NULL)), TESSEL_ERR_OPERATION_FAILED,
-                 "(0 != QUORDBExecute(pConn, szSQLUpsert, NULL))", false);
-    szSQLUpsert = FillPersonUpsert(row);
-    TESSEL_CHECK(!szSQLUpsert, TESSEL_ERR_USER_INPUT, "!szSQLUpsert", false);
-    TESSEL_CHECK((0 != QUORDBExecute(pConn, szSQLUpsert.get(), NULL)), TESSEL_ERR_OPERATION_FAILED,
-                 "(0 != QUORDBExecute(pConn, szSQLUpsert, NULL))", false);
-    return true;
+    IndexRow row;
+    // The person row follows only once the object row is in.
+    return FilteredRow(row, pObj, jFilter) && RunUpsert(pConn, FillObjectUpsert(row)) &&
+           RunUpsert(pConn, FillPersonUpsert(row));
 }
 
 bool TesselObjectIndexEx(DBConnect_tag *pConn, const char *szID, const char *szNs, unsigned int requester) {
@@ -340,44 +368,24 @@ bool TesselObjectBatchIndex(TESSEL_OBJECT *pList) {
 }
 
 bool TesselObjectEscapeStringArray(std::string &strOut, const Json::Value &jsArray) {
-    TESSEL_CHECK(!jsArray.isArray(), TESSEL_ERR_BAD_PARAMETERS, "!jsArray.isArray()", false);
-    if (jsArray.empty()) {
-        strOut = SZ_SQL_EMPTY_LIST;
-        return true;
-    }
-    std::string strList = "(";
-    for (Json::ArrayIndex i = 0; i < jsArray.size(); ++i) {
-        const Json::Value &jId = jsArray[i];
+    return EscapeList(strOut, jsArray, "!szSQL", [](const Json::Value &jId) {
         const std::string strId = jId.isString() ? jId.asString() : std::string();
         SqlText szSQL;
         if (jId.isString() && std::string::npos == strId.find('\0')) {
             szSQL.reset(QUORDBEscapeStringEX3(QUOR_DB_PGSQL, SZ_SQL_LIST_TEXT, strId.c_str()));
         }
-        TESSEL_CHECK(!szSQL, TESSEL_ERR_USER_INPUT, "!szSQL", false);
-        strList.append(0 == i ? "" : ",").append(szSQL.get());
-    }
-    strOut = strList + ")";
-    return true;
+        return szSQL;
+    });
 }
 
 bool TesselObjectEscapeUIntArray(std::string &strOut, const Json::Value &jsArray) {
-    TESSEL_CHECK(!jsArray.isArray(), TESSEL_ERR_BAD_PARAMETERS, "!jsArray.isArray()", false);
-    if (jsArray.empty()) {
-        strOut = SZ_SQL_EMPTY_LIST;
-        return true;
-    }
-    std::string strList = "(";
-    for (Json::ArrayIndex i = 0; i < jsArray.size(); ++i) {
-        const Json::Value &jUid = jsArray[i];
+    return EscapeList(strOut, jsArray, "NULL == szSQL", [](const Json::Value &jUid) {
         SqlText szSQL;
         // Only what a bigint column can hold: no signs, fractions or text.
         if (jUid.isUInt64() && jUid.asUInt64() <= static_cast<Json::UInt64>(LLONG_MAX)) {
             szSQL.reset(QUORDBEscapeStringEX3(QUOR_DB_PGSQL, SZ_SQL_LIST_LLINT,
                                               static_cast<long long>(jUid.asUInt64())));
         }
-        TESSEL_CHECK(NULL == szSQL, TESSEL_ERR_USER_INPUT, "NULL == szSQL", false);
-        strList.append(0 == i ? "" : ",").append(szSQL.get());
-    }
-    strOut = strList + ")";
-    return true;
+        return szSQL;
+    });
 }
