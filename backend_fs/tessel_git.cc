@@ -117,6 +117,15 @@ static_assert(34 == kCheckoutStrategy, "checkout strategy");
 constexpr size_t kPathMax = 4095;
 constexpr int kListCapacity = 1024;
 
+// The commit id szVersion names; one that does not parse is all zeros and
+// finds no commit.
+git_oid OidOrZero(const char *szVersion) {
+    git_oid id;
+    memset(&id, 0, sizeof(id));
+    (void)git_oid_fromstr(&id, szVersion);
+    return id;
+}
+
 git_checkout_options CheckoutOptions() {
     git_checkout_options opts = GIT_CHECKOUT_OPTIONS_INIT;
     opts.checkout_strategy = kCheckoutStrategy;
@@ -522,10 +531,7 @@ int GitCommit(const char *szRepoPath, const char *szBaseVersion, long long mtime
                     NULL != szCommitMsg);
     Repo repo;
     GIT_CHECK(git_repository_open(repo.out(), szRepoPath), "git_repository_open(&repo, szRepoPath)");
-    // An identifier that does not parse finds no commit below.
-    git_oid base_commit_id;
-    memset(&base_commit_id, 0, sizeof(base_commit_id));
-    (void)git_oid_fromstr(&base_commit_id, szBaseVersion);
+    const git_oid base_commit_id = OidOrZero(szBaseVersion);
     Commit base_commit;
     GIT_CHECK(git_commit_lookup(base_commit.out(), repo.get(), &base_commit_id),
                  "git_commit_lookup(&base_commit, repo, &base_commit_id)");
@@ -591,10 +597,7 @@ int GitLoadCommit(const char *szRepoPath, const char *szVersion, const char *szD
     GIT_CHECK_PARAM(NULL != szRepoPath && NULL != szVersion && NULL != szDir);
     Repo repo;
     GIT_CHECK(git_repository_open(repo.out(), szRepoPath), "git_repository_open(&repo, szRepoPath)");
-    // An identifier that does not parse finds no commit below.
-    git_oid commit_id;
-    memset(&commit_id, 0, sizeof(commit_id));
-    (void)git_oid_fromstr(&commit_id, szVersion);
+    const git_oid commit_id = OidOrZero(szVersion);
     Commit commit;
     GIT_CHECK(git_commit_lookup(commit.out(), repo.get(), &commit_id),
                  "git_commit_lookup(&commit, repo, &commit_id)");
@@ -641,9 +644,7 @@ int GitGetCommitInfo(const char *szRepoPath, const char *szVersion, Json::Value 
         GIT_CHECK(git_commit_lookup(commit.out(), repo.get(), &lastest_commit_id),
                      "git_commit_lookup(&commit, repo, &lastest_commit_id)");
     } else {
-        git_oid commit_id;
-        memset(&commit_id, 0, sizeof(commit_id));
-        (void)git_oid_fromstr(&commit_id, szVersion);
+        const git_oid commit_id = OidOrZero(szVersion);
         GIT_CHECK(git_commit_lookup(commit.out(), repo.get(), &commit_id),
                      "git_commit_lookup(&commit, repo, &commit_id)");
     }
