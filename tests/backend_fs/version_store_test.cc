@@ -23,6 +23,7 @@
 #include "support/json_text.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
+#include "support/versioned_fields.h"
 #include "tessel_backend.h"
 #include "tessel_file.h"
 #include "tesselobject.h"
@@ -102,12 +103,7 @@ protected:
         const bool ok =
             backend_->Get(Req(R"("requester": 1001)" + (strMembers.empty() ? "" : ", " + strMembers)), &obj);
         EXPECT_EQ(blOk, ok) << strMembers << ::testing::PrintToString(ErrMsgs());
-        Json::Value jRet(Json::objectValue);
-        jRet["text"] = obj.get_text();
-        jRet["version"] = obj.get_version();
-        jRet["commit_msg"] = obj.get_commit_msg();
-        jRet["mtime"] = (Json::Int64)obj.get_mtime();
-        return jRet;
+        return VersionedFields(obj);
     }
 
     std::string Base() const { return kNsDir + "/" + id_; }

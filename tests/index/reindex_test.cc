@@ -22,6 +22,7 @@
 #include "support/json_text.h"
 #include "support/sandbox.h"
 #include "support/scratch.h"
+#include "support/versioned_fields.h"
 #include "tessel_backend.h"
 #include "tessel_index.h"
 
@@ -109,12 +110,7 @@ protected:
         jParm["id"] = strId;
         TESSEL_OBJECT obj;
         EXPECT_TRUE(fs_->Get(jParm, &obj)) << ::testing::PrintToString(ErrMsgs());
-        Json::Value jRet(Json::objectValue);
-        jRet["text"] = obj.get_text();
-        jRet["version"] = obj.get_version();
-        jRet["commit_msg"] = obj.get_commit_msg();
-        jRet["mtime"] = (Json::Int64)obj.get_mtime();
-        return jRet;
+        return VersionedFields(obj);
     }
 
     std::unique_ptr<TESSEL_BACKEND_OP> fs_{RegisterBackend::New("fs")};
