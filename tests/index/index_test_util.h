@@ -17,6 +17,7 @@
 
 namespace index_test {
 
+constexpr char kConf[] = "/usr/quor/etc/tessel.conf";
 constexpr char kCounter[] = "/tmp/tessel.tmp";
 constexpr char kCounterLock[] = "/tmp/tessel.tmp.lock";
 
@@ -30,11 +31,14 @@ inline std::string CountOneClosing() {
     return tessel_test::ReadFile(kCounter);
 }
 
+// Rows of a query result, each field as text.
+using Table = std::vector<std::vector<std::string>>;
+
 // The rows of a query on a connection of the test's own to database
 // "tessel", each field as text ("<null>" for SQL NULL). A failed query is a
 // test failure and gives no rows.
-inline std::vector<std::vector<std::string>> Rows(const std::string &sql) {
-    std::vector<std::vector<std::string>> rows;
+inline Table Rows(const std::string &sql) {
+    Table rows;
     PGconn *conn = tessel_test::PgConnect("tessel");
     PGresult *res = (nullptr == conn) ? nullptr : PQexec(conn, sql.c_str());
     EXPECT_EQ(PGRES_TUPLES_OK, PQresultStatus(res)) << sql << ": " << (conn ? PQerrorMessage(conn) : "no connection");

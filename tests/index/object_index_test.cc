@@ -20,14 +20,9 @@
 
 namespace {
 
-using index_test::Exec;
-using index_test::kObjectColumns;
-using index_test::Rows;
+using namespace index_test;
 using namespace tessel_test;
 
-using Table = std::vector<std::vector<std::string>>;
-
-constexpr char kConf[] = "/usr/quor/etc/tessel.conf";
 const std::string kIdA = "1001_" + std::string(96, 'a');
 const std::string kIdB = "1002_" + std::string(96, 'b');
 const std::string kIdC = "1001_" + std::string(96, 'c');

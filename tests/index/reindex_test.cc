@@ -28,15 +28,11 @@
 
 namespace {
 
-using index_test::Exec;
-using index_test::kObjectColumns;
-using index_test::Rows;
+using namespace index_test;
 using namespace tessel_test;
 
-using Table = std::vector<std::vector<std::string>>;
 using Msgs = std::vector<std::string>;
 
-constexpr char kConf[] = "/usr/quor/etc/tessel.conf";
 constexpr char kRepo[] = "/volume1/@Tessel";
 constexpr char kLinks[] = "/usr/quor/etc/tessel/ns";
 
