@@ -13,6 +13,8 @@
 #include <gtest/gtest.h>
 
 #include "common/tessel_report.h"
+#include "support/error_stack.h"
+#include "support/json_text.h"
 #include "support/sandbox.h"
 #include "tessel_error.h"
 
@@ -20,11 +22,12 @@ static constexpr const char kTesselModule[] = "tests/common/error_test";
 
 namespace {
 
+using Lines = std::vector<std::string>;
+
 // Runs fn on a new thread, whose error stack starts empty.
 template <typename Fn>
 void OnFreshThread(Fn fn) {
-    std::thread t(fn);
-    t.join();
+    std::thread(fn).join();
 }
 
 std::string ReadStream(FILE *f) {
@@ -32,8 +35,7 @@ std::string ReadStream(FILE *f) {
     rewind(f);
     std::string text;
     char buf[4096];
-    size_t n;
-    while (0 < (n = fread(buf, 1, sizeof(buf), f))) {
+    for (size_t n; 0 < (n = fread(buf, 1, sizeof(buf), f));) {
         text.append(buf, n);
     }
     return text;
@@ -67,32 +69,32 @@ const char kThreeFramePrint[] =
     "  ErrNo=[1008] (Object not exists.)\n";
 
 // The report lines of common/tessel_error logged since mark, without the
-// "common/tessel_error:<line> " prefix, and whether all were at LOG_ERR.
-std::vector<std::string> ErrorModuleLines(size_t mark, bool *pAllErr) {
+// "common/tessel_error:<line> " prefix; all of them must be at LOG_ERR.
+Lines ErrorModuleLines(size_t mark) {
     static const std::string prefix = "common/tessel_error:";
-    std::vector<std::string> lines;
-    *pAllErr = true;
+    Lines lines;
     for (const tessel_test::SyslogLine &line : tessel_test::SyslogSince(mark)) {
         const std::string &msg = line.message;
-        if (0 != msg.compare(0, prefix.size(), prefix)) {
-            continue;
-        }
         size_t digits = msg.find_first_not_of("0123456789", prefix.size());
-        if (std::string::npos == digits || prefix.size() == digits || ' ' != msg[digits]) {
+        if (0 != msg.compare(0, prefix.size(), prefix) || std::string::npos == digits ||
+            prefix.size() == digits || ' ' != msg[digits]) {
             continue;
         }
         lines.push_back(msg.substr(digits + 1));
-        *pAllErr = *pAllErr && (LOG_ERR == (line.priority & 7));
+        EXPECT_EQ(LOG_ERR, line.priority & 7) << line.raw;
     }
     return lines;
 }
 
-// Logs a unique line and waits for it, so that everything logged before it
-// has reached the captured log.
-void SyncSyslog(size_t mark, const std::string &tag) {
+// Logs TesselErrSyslog's report and a unique line after it, and waits for
+// that line, so that the whole report has reached the captured log.
+Lines SyslogReport(const std::string &tag) {
+    size_t mark = tessel_test::SyslogMark();
+    TesselErrSyslog();
     std::string sentinel = "sync " + tag + " " + std::to_string(getpid());
     syslog(LOG_INFO, "%s", sentinel.c_str());
-    ASSERT_TRUE(tessel_test::WaitForSyslog(sentinel, mark).has_value());
+    EXPECT_TRUE(tessel_test::WaitForSyslog(sentinel, mark).has_value());
+    return ErrorModuleLines(mark);
 }
 
 TEST(ErrorStack, IsPerThread) {
@@ -101,19 +103,18 @@ TEST(ErrorStack, IsPerThread) {
     pthread_barrier_t barrier;
     ASSERT_EQ(0, pthread_barrier_init(&barrier, NULL, kThreads));
     std::vector<std::thread> threads;
-    std::vector<int> startCodes(kThreads, -99);
     std::vector<std::string> seen(kThreads);
     for (int i = 0; i < kThreads; ++i) {
         threads.emplace_back([&, i] {
-            startCodes[i] = TesselErrCodeGet();
-            std::string own = "thread " + std::to_string(i);
-            TesselErrSetEx(1000 + i, "worker", i, "%s", own.c_str());
+            int start = tessel_test::ErrCode();
+            TesselErrSetEx(1000 + i, "worker", i, "thread %d", i);
             TesselErrAppendEx("caller", 100 + i, "up from %d", i);
             // Every thread has set its error before any reads its own back.
             pthread_barrier_wait(&barrier);
-            const Json::Value &jStack = TesselErrMsgGet();
-            seen[i] = std::to_string(TesselErrCodeGet()) + "|" + jStack[0u]["msg"].asString() + "|" +
-                      jStack[1u]["msg"].asString() + "|" + std::to_string(jStack.size());
+            seen[i] = std::to_string(start) + "|" + std::to_string(tessel_test::ErrCode());
+            for (const std::string &msg : tessel_test::ErrMsgs()) {
+                seen[i] += "|" + msg;
+            }
         });
     }
     for (std::thread &t : threads) {
@@ -121,42 +122,22 @@ TEST(ErrorStack, IsPerThread) {
     }
     pthread_barrier_destroy(&barrier);
     for (int i = 0; i < kThreads; ++i) {
-        EXPECT_EQ(0, startCodes[i]) << "thread " << i << " started with an error";
-        EXPECT_EQ(std::to_string(1000 + i) + "|thread " + std::to_string(i) + "|up from " + std::to_string(i) + "|2",
-                  seen[i]);
+        std::string n = std::to_string(i);
+        EXPECT_EQ("0|" + std::to_string(1000 + i) + "|thread " + n + "|up from " + n, seen[i]);
     }
-    ASSERT_EQ(1u, TesselErrMsgGet().size());
-    EXPECT_EQ(1026, TesselErrCodeGet());
-    EXPECT_EQ("main thread", TesselErrMsgGet()[0u]["msg"].asString());
+    EXPECT_EQ(1026, tessel_test::ErrCode());
+    EXPECT_EQ(Lines{"main thread"}, tessel_test::ErrMsgs());
 }
 
 TEST(ErrorStack, FramesRootCauseFirstAndOnlySetClears) {
     TesselErrSetEx(1, "stale", 1, "stale");
     MakeThreeFrameError();
-    const Json::Value &jStack = TesselErrMsgGet();
-    ASSERT_EQ(3u, jStack.size());
-    Json::Value jRoot(Json::objectValue);
-    jRoot["code"] = 1008;
-    jRoot["file"] = "object/object_get";
-    jRoot["line"] = 120;
-    jRoot["msg"] = "NULL == pObj";
-    EXPECT_EQ(jRoot, jStack[0u]);
-    Json::Value jUp(Json::objectValue);
-    jUp["file"] = "object/object_list";
-    jUp["line"] = 45;
-    jUp["msg"] = "!Get(jParm)";
-    EXPECT_EQ(jUp, jStack[1u]);
-    Json::Value jBare(Json::objectValue);
-    jBare["file"] = "";
-    jBare["line"] = 7;
-    jBare["msg"] = "";
-    EXPECT_EQ(jBare, jStack[2u]);
-
+    EXPECT_EQ(tessel_test::Parse(R"([{"code":1008,"file":"object/object_get","line":120,"msg":"NULL == pObj"},)"
+                                 R"j({"file":"object/object_list","line":45,"msg":"!Get(jParm)"},)j"
+                                 R"({"file":"","line":7,"msg":""}])"),
+              TesselErrMsgGet());
     TesselErrSetEx(1003, NULL, 0, NULL);
-    ASSERT_EQ(1u, TesselErrMsgGet().size());
-    EXPECT_EQ(1003, TesselErrCodeGet());
-    EXPECT_EQ("", TesselErrMsgGet()[0u]["file"].asString());
-    EXPECT_EQ("", TesselErrMsgGet()[0u]["msg"].asString());
+    EXPECT_EQ(tessel_test::Parse(R"([{"code":1003,"file":"","line":0,"msg":""}])"), TesselErrMsgGet());
 }
 
 TEST(ErrorStack, CodeOfTheRootCauseOnly) {
@@ -178,12 +159,11 @@ TEST(ErrorStack, MessageFormatting) {
         std::string text(length, 'x');
         text.back() = 'y';
         TesselErrSetEx(1000, "f", 1, "%s", text.c_str());
-        EXPECT_EQ(text, TesselErrMsgGet()[0u]["msg"].asString()) << "length " << length;
         TesselErrAppendEx("f", 2, "<%s>", text.c_str());
-        EXPECT_EQ("<" + text + ">", TesselErrMsgGet()[1u]["msg"].asString()) << "length " << length;
+        EXPECT_EQ((Lines{text, "<" + text + ">"}), tessel_test::ErrMsgs()) << "length " << length;
     }
     TesselErrSetEx(1000, "f", 1, "%d of %s, %u%%", -3, "seven", 7u);
-    EXPECT_EQ("-3 of seven, 7%", TesselErrMsgGet()[0u]["msg"].asString());
+    EXPECT_EQ(Lines{"-3 of seven, 7%"}, tessel_test::ErrMsgs());
 }
 
 TEST(ErrorStack, GetStringGivesTheInterfaceKeyNotTheMessage) {
@@ -193,25 +173,16 @@ TEST(ErrorStack, GetStringGivesTheInterfaceKeyNotTheMessage) {
         const char *key;      // expected result (nullptr: a null pointer)
         const char *section;  // expected section afterwards
     } cases[] = {
-        {1000, "error_system", "common"},
-        {1008, nullptr, ""},
-        {1005, nullptr, ""},
-        {1030, nullptr, ""},
-        {999, "", kUntouched},   // unknown: section place left alone
-        {1031, nullptr, ""},
-        {1032, "", kUntouched},  // a code without a table entry
-        {902, "", kUntouched},
-        {0, "", kUntouched},
+        {1000, "error_system", "common"}, {1008, nullptr, ""}, {1005, nullptr, ""},
+        {1030, nullptr, ""},              {1031, nullptr, ""},
+        // unknown codes, or codes without a table entry: section place left alone
+        {999, "", kUntouched}, {1032, "", kUntouched}, {902, "", kUntouched}, {0, "", kUntouched},
     };
     for (const Case &c : cases) {
         const char *szSection = kUntouched;
         const char *szKey = TesselErrGetString(c.code, &szSection);
-        if (nullptr == c.key) {
-            EXPECT_EQ(nullptr, szKey) << c.code;
-        } else {
-            ASSERT_NE(nullptr, szKey) << c.code;
-            EXPECT_STREQ(c.key, szKey) << c.code;
-        }
+        EXPECT_EQ(nullptr == c.key, nullptr == szKey) << c.code;
+        EXPECT_STREQ(c.key, szKey) << c.code;
         EXPECT_STREQ(c.section, szSection) << c.code;
     }
     EXPECT_STREQ("error_system", TesselErrGetString(1000));
@@ -234,7 +205,6 @@ TEST(ErrorStack, CodeTableOrder) {
 TEST(ErrorReport, PrintLayout) {
     MakeThreeFrameError();
     EXPECT_EQ(kThreeFramePrint, PrintedReport());
-
     struct Case {
         int code;
         const char *errnoLine;  // "" when the code has no message
@@ -246,9 +216,7 @@ TEST(ErrorReport, PrintLayout) {
         {1027, "  ErrNo=[1027] (tessel is disabled.)\n"},
         {1030, "  ErrNo=[1030] (Object owner is disabled or expired.)\n"},
         {1031, "  ErrNo=[1031] (Object ID already exists.)\n"},
-        {1032, ""},
-        {900, ""},
-        {999, ""},
+        {1032, ""}, {900, ""}, {999, ""},
     };
     for (const Case &c : cases) {
         TesselErrSetEx(c.code, "common/tessel_conf", 33, "!jConf.isObject()");
@@ -259,27 +227,13 @@ TEST(ErrorReport, PrintLayout) {
 
 TEST(ErrorReport, PrintWithoutCodeOrWithMissingMembers) {
     OnFreshThread([] {
+        EXPECT_EQ("", PrintedReport()) << "an empty stack prints nothing";
         TesselErrAppendEx("lock/tessel_lock", 12, "!ReadLock()");
         EXPECT_EQ("tessel call stack:\n  !ReadLock() (lock/tessel_lock:12)\n", PrintedReport());
-
         // An application may edit its stack; missing members print as placeholders.
         TesselErrSetEx(1001, "x", 5, "y");
-        Json::Value &jFrame = TesselErrMsgGet()[0u];
-        jFrame.removeMember("msg");
-        jFrame.removeMember("file");
-        jFrame.removeMember("line");
+        TesselErrMsgGet()[0u] = tessel_test::Parse(R"({"code":1001})");
         EXPECT_EQ("tessel call stack:\n  ---- (----:0)\n  ErrNo=[1001] (Lock failed.)\n", PrintedReport());
-    });
-}
-
-TEST(ErrorReport, EmptyStackPrintsNothing) {
-    OnFreshThread([] {
-        EXPECT_EQ("", PrintedReport());
-        size_t mark = tessel_test::SyslogMark();
-        TesselErrSyslog();
-        SyncSyslog(mark, "empty");
-        bool allErr = true;
-        EXPECT_TRUE(ErrorModuleLines(mark, &allErr).empty());
     });
 }
 
@@ -301,30 +255,14 @@ TEST(ErrorReport, NullStreamMeansStandardError) {
 
 TEST(ErrorReport, SyslogLayout) {
     MakeThreeFrameError();
-    size_t mark = tessel_test::SyslogMark();
-    TesselErrSyslog();
-    ASSERT_TRUE(tessel_test::WaitForSyslog("ErrNo=[1008] (Object not exists.)", mark).has_value());
-    bool allErr = false;
-    std::vector<std::string> lines = ErrorModuleLines(mark, &allErr);
-    std::vector<std::string> want = {
-        "tessel call stack:",
-        "   (:7)",
-        "  !Get(jParm) (object/object_list:45)",
-        "  NULL == pObj (object/object_get:120)",
-        "  ErrNo=[1008] (Object not exists.)",
-    };
-    EXPECT_EQ(want, lines);
-    EXPECT_TRUE(allErr) << "report lines must be logged at LOG_ERR";
-
-    // Without a code in frame 0, no ErrNo line.
+    EXPECT_EQ((Lines{"tessel call stack:", "   (:7)", "  !Get(jParm) (object/object_list:45)",
+                     "  NULL == pObj (object/object_get:120)", "  ErrNo=[1008] (Object not exists.)"}),
+              SyslogReport("three"));
     OnFreshThread([] {
+        EXPECT_EQ(Lines{}, SyslogReport("empty"));
+        // Without a code in frame 0, no ErrNo line.
         TesselErrAppendEx("dlopen/loader", 9, "NULL == pHookTable");
-        size_t mark2 = tessel_test::SyslogMark();
-        TesselErrSyslog();
-        SyncSyslog(mark2, "nocode");
-        bool allErr2 = false;
-        std::vector<std::string> want2 = {"tessel call stack:", "  NULL == pHookTable (dlopen/loader:9)"};
-        EXPECT_EQ(want2, ErrorModuleLines(mark2, &allErr2));
+        EXPECT_EQ((Lines{"tessel call stack:", "  NULL == pHookTable (dlopen/loader:9)"}), SyslogReport("nocode"));
     });
 }
 
@@ -332,7 +270,9 @@ TEST(ErrorReport, SettingAndAppendingLogNothing) {
     size_t mark = tessel_test::SyslogMark();
     TesselErrSetEx(1000, "hushed", 1, "hushed set %d", getpid());
     TesselErrAppendEx("hushed", 2, "hushed append %d", getpid());
-    SyncSyslog(mark, "after setting");
+    std::string sentinel = "sync after setting " + std::to_string(getpid());
+    syslog(LOG_INFO, "%s", sentinel.c_str());
+    ASSERT_TRUE(tessel_test::WaitForSyslog(sentinel, mark).has_value());
     for (const tessel_test::SyslogLine &line : tessel_test::SyslogSince(mark)) {
         EXPECT_EQ(std::string::npos, line.message.find("hushed")) << line.raw;
     }
@@ -356,28 +296,19 @@ TEST(ReportMacros, LogLineThenFrame) {
     size_t mark = tessel_test::SyslogMark();
     EXPECT_EQ(-1, FailsWithAppend());
     EXPECT_EQ(ENOENT, errno);
-
+    EXPECT_EQ(TESSEL_ERR_OPEN_FILE, tessel_test::ErrCode());
+    EXPECT_EQ((Lines{"0 > fdLock", "!FailsWithRaise()"}), tessel_test::ErrMsgs());
     const Json::Value &jStack = TesselErrMsgGet();
-    ASSERT_EQ(2u, jStack.size());
-    EXPECT_EQ(TESSEL_ERR_OPEN_FILE, jStack[0u]["code"].asInt());
-    EXPECT_EQ(kTesselModule, jStack[0u]["file"].asString());
-    EXPECT_EQ("0 > fdLock", jStack[0u]["msg"].asString());
     EXPECT_FALSE(jStack[1u].isMember("code"));
-    EXPECT_EQ("!FailsWithRaise()", jStack[1u]["msg"].asString());
-    int rootLine = jStack[0u]["line"].asInt();
-    int upLine = jStack[1u]["line"].asInt();
-
-    std::string want1 = std::string(kTesselModule) + ":" + std::to_string(rootLine) +
-                        " Failed [0 > fdLock], err=" + strerror(ENOENT);
-    std::string want2 = std::string(kTesselModule) + ":" + std::to_string(upLine) +
-                        " Failed [!FailsWithRaise()], err=" + strerror(ENOENT);
-    std::optional<tessel_test::SyslogLine> line1 = tessel_test::WaitForSyslog(want1, mark);
-    std::optional<tessel_test::SyslogLine> line2 = tessel_test::WaitForSyslog(want2, mark);
-    ASSERT_TRUE(line1.has_value());
-    ASSERT_TRUE(line2.has_value());
-    EXPECT_EQ(want1, line1->message);
-    EXPECT_EQ(LOG_ERR, line1->priority & 7);
-    EXPECT_EQ(LOG_ERR, line2->priority & 7);
+    for (const Json::Value &jFrame : jStack) {
+        EXPECT_EQ(kTesselModule, jFrame["file"].asString());
+        std::string want = std::string(kTesselModule) + ":" + std::to_string(jFrame["line"].asInt()) + " Failed [" +
+                           jFrame["msg"].asString() + "], err=" + strerror(ENOENT);
+        std::optional<tessel_test::SyslogLine> line = tessel_test::WaitForSyslog(want, mark);
+        ASSERT_TRUE(line.has_value()) << want;
+        EXPECT_EQ(want, line->message);
+        EXPECT_EQ(LOG_ERR, line->priority & 7);
+    }
 }
 
 }  // namespace
