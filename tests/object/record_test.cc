@@ -92,8 +92,13 @@ TEST(ObjectRecord, NewRecordAndResetRecordDifferWhereIntended) {
 }
 
 TEST(ObjectRecord, ClearOfANewRecordSetsNoOwnerAndAnEmptyPerson) {
+    TesselObjectClear(NULL);
     TESSEL_OBJECT object;
-    object.clear();
+    object.set_ns("notes");
+    object.set_perm("rw");
+    TesselObjectClear(&object);
+    EXPECT_EQ("", object.get_ns());
+    EXPECT_EQ("rw", object.get_perm());
     EXPECT_EQ(UID_ERR, object.get_owner());
     EXPECT_EQ("{}", Text(object.get_person()));
     EXPECT_TRUE(object.get_text().isNull()) << "null stays null";
@@ -104,26 +109,13 @@ TEST(ObjectRecord, ClearCopesWithScalarJsonFields) {
     // A scalar cannot be emptied in place (jsoncpp throws); fromJson leaves
     // the binary descriptors as text, and callers may store any JSON value.
     TESSEL_OBJECT object;
-    ASSERT_TRUE(object.set_binary_info(Json::Value("{\"a\":1}")));
-    ASSERT_TRUE(object.set_commit_msg(Json::Value(42)));
-    ASSERT_TRUE(object.set_acl(Json::Value(true)));
-    ASSERT_TRUE(object.set_err(Json::Value(1.5)));
+    ASSERT_TRUE(object.set_binary_info(Json::Value("{\"a\":1}")) && object.set_commit_msg(Json::Value(42)) &&
+                object.set_acl(Json::Value(true)) && object.set_err(Json::Value(1.5)));
     object.clear();
-    EXPECT_TRUE(object.get_binary_info().isNull());
-    EXPECT_TRUE(object.get_commit_msg().isNull());
-    EXPECT_TRUE(object.get_acl().isNull());
-    EXPECT_TRUE(object.get_err().isNull());
-}
-
-TEST(ObjectRecord, TesselObjectClearResetsAndIgnoresNull) {
-    TesselObjectClear(NULL);
-    TESSEL_OBJECT object;
-    object.set_ns("notes");
-    object.set_perm("rw");
-    TesselObjectClear(&object);
-    EXPECT_EQ("", object.get_ns());
-    EXPECT_EQ("rw", object.get_perm());
-    EXPECT_EQ(UID_ERR, object.get_owner());
+    for (const Json::Value &jField :
+         {object.get_binary_info(), object.get_commit_msg(), object.get_acl(), object.get_err()}) {
+        EXPECT_TRUE(jField.isNull()) << Text(jField);
+    }
 }
 
 TEST(ObjectRecord, RefGettersReferToTheFieldItself) {
@@ -258,8 +250,7 @@ TEST(ObjectAlloc, ChainsAreWalkedAndFreedWhole) {
 
 TEST(ObjectList, OwnsAndFreesItsChain) {
     TESSEL_OBJECT_LIST list;
-    EXPECT_TRUE(list.empty());
-    EXPECT_EQ(0u, list.size());
+    EXPECT_TRUE(list.empty() && 0u == list.size());
     list.clear();
 
     for (int i = 0; i < 3; ++i) {
@@ -289,15 +280,13 @@ TEST(ObjectFieldAll, AsksForEveryOptionalField) {
               Text(TesselObjectFieldAll()));
 }
 
-struct UserNameCase {
-    unsigned int uid;
-    bool mustExist;
-    bool found;
-    const char *name;  // what strName holds afterwards
-};
-
 TEST(UserName, FromTheUserDatabase) {
-    const UserNameCase cases[] = {
+    const struct {
+        unsigned int uid;
+        bool mustExist;
+        bool found;
+        const char *name;  // what strName holds afterwards
+    } cases[] = {
         {tessel_test::kUidAlice, true, true, "alice"},
         {tessel_test::kUidBob, false, true, "bob"},
         {tessel_test::kUidErin, true, true, "Erin Example"},   // domain user: the real name
@@ -308,7 +297,7 @@ TEST(UserName, FromTheUserDatabase) {
         {UID_ERR, false, true, "Anonymous"},
         {UID_ERR, true, false, "untouched"},
     };
-    for (const UserNameCase &c : cases) {
+    for (const auto &c : cases) {
         std::string strName = "untouched";
         EXPECT_EQ(c.found ? TRUE : FALSE, TesselGetUserName(c.uid, strName, c.mustExist))
             << c.uid << (c.mustExist ? " must exist" : "");
