@@ -32,8 +32,6 @@ const std::string kRepo = "/volume1/@Tessel";
 const std::string kNsDir = kRepo + "/ledger";
 using Msgs = std::vector<std::string>;
 
-
-
 class FsStore : public ::testing::Test {
 protected:
     void SetUp() override {
@@ -141,17 +139,25 @@ TEST_F(FsStore, GetReadsWhatTheSelectionAsksFor) {
         EXPECT_EQ(0, obj.get_ctime());
     }
     // A bool, a string and an object holding a true somewhere select; an
-    // object of falses does not.
-    for (const char *szField :
-         {R"({"metatext": true})", R"({"metatext": "all"})", R"({"metatext": {"x": {"k": true}}})"}) {
+    // object of falses does not. Meta-binaries are read only when asked for;
+    // this object has none.
+    struct Selection {
+        const char *field;
+        Json::Value (TESSEL_OBJECT::*member)() const;
+        const char *expected;
+    } selections[] = {
+        {R"({"metatext": true})", &TESSEL_OBJECT::get_metatext, R"({"k": "v"})"},
+        {R"({"metatext": "all"})", &TESSEL_OBJECT::get_metatext, R"({"k": "v"})"},
+        {R"({"metatext": {"x": {"k": true}}})", &TESSEL_OBJECT::get_metatext, R"({"k": "v"})"},
+        {R"({"metatext": {"k": false}})", &TESSEL_OBJECT::get_metatext, "null"},
+        {R"({"text": {"a": false}})", &TESSEL_OBJECT::get_metatext, "null"},
+        {R"({"person": "summary"})", &TESSEL_OBJECT::get_person, R"({"count": 1})"},
+        {R"({"metabinary_info": true})", &TESSEL_OBJECT::get_metabinary_info, "{}"},
+    };
+    for (const Selection &sel : selections) {
         TESSEL_OBJECT obj;
-        ASSERT_TRUE(get(szField, obj)) << szField;
-        EXPECT_EQ(Parse(R"({"k": "v"})"), obj.get_metatext()) << szField;
-    }
-    for (const char *szField : {R"({"metatext": {"k": false}})", R"({"text": {"a": false}})"}) {
-        TESSEL_OBJECT obj;
-        ASSERT_TRUE(get(szField, obj)) << szField;
-        EXPECT_TRUE(obj.get_metatext().isNull()) << szField;
+        ASSERT_TRUE(get(sel.field, obj)) << sel.field;
+        EXPECT_EQ(Parse(sel.expected), (obj.*sel.member)()) << sel.field;
     }
     {
         // A number is a bad selector: logged and ignored.
@@ -162,17 +168,6 @@ TEST_F(FsStore, GetReadsWhatTheSelectionAsksFor) {
         auto line = WaitForSyslog("bad jField[metatext] type, jField[metatext]=7", mark, LOG_USER | LOG_ERR);
         ASSERT_TRUE(line.has_value());
         EXPECT_EQ(0u, line->message.find("backend_fs/tesselBackend_fs:"));
-    }
-    {
-        TESSEL_OBJECT obj;
-        ASSERT_TRUE(get(R"({"person": "summary"})", obj));
-        EXPECT_EQ(Parse(R"({"count": 1})"), obj.get_person());
-    }
-    {
-        // Meta-binaries are read only when asked for; this object has none.
-        TESSEL_OBJECT obj;
-        ASSERT_TRUE(get(R"({"metabinary_info": true})", obj));
-        EXPECT_EQ(Json::Value(Json::objectValue), obj.get_metabinary_info());
     }
     {
         TESSEL_OBJECT obj;
@@ -251,13 +246,13 @@ TEST_F(FsStore, DeleteRemovesTheObjectDirectoryAndNothingElse) {
         Json::Value jParm(Json::objectValue);
         jParm["ns"] = h.ns;
         jParm["id"] = h.id;
+        SCOPED_TRACE(h.ns + " " + h.id);
         ErrClear();
-        EXPECT_FALSE(backend_->Delete(jParm)) << h.ns << " " << h.id;
-        EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode()) << h.ns << " " << h.id;
-        Msgs msgs = ErrMsgs();
-        ASSERT_FALSE(msgs.empty());
-        EXPECT_EQ(h.msgs.front(), msgs.front()) << h.ns << " " << h.id;
-        EXPECT_EQ("!mf_init(jParm)", msgs.back()) << h.ns << " " << h.id;
+        EXPECT_FALSE(backend_->Delete(jParm));
+        EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode());
+        ASSERT_FALSE(ErrMsgs().empty());
+        EXPECT_EQ(h.msgs.front(), ErrMsgs().front());
+        EXPECT_EQ("!mf_init(jParm)", ErrMsgs().back());
     }
     for (const std::string &strDir :
          {kRepo + "/x", kNsDir + "/1001_a/b", kRepo + "/other", kNsDir + "/" + strGone, kNsDir + "/" + strKept}) {

@@ -141,13 +141,18 @@ protected:
         return strVer;
     }
 
-    // Frame and log line of a failed libgit2 call: its text, result and message.
-    void ExpectGitFailure(size_t mark, int code, int ret, const std::string &call) {
+    // fn fails with ret, leaving the frame and log line of the failed libgit2
+    // call: its text, result (logged, when it is not ret) and message.
+    template <typename Fn>
+    void ExpectGitFailure(Fn fn, int ret, int code, const std::string &call, int logged = 0) {
+        ErrClear();
+        size_t mark = SyslogMark();
+        EXPECT_EQ(ret, fn());
         EXPECT_EQ(code, ErrCode());
         EXPECT_EQ(Msgs{call}, ErrMsgs());
         EXPECT_EQ("tessel_git", TesselErrMsgGet()[0u]["file"].asString());
         std::string head = "tessel_git:" + std::to_string(TesselErrMsgGet()[0u]["line"].asInt()) + " Failed [" + call +
-                           "][" + std::to_string(ret) + "][" + git_error_last()->message + "], err=";
+                           "][" + std::to_string(logged ? logged : ret) + "][" + git_error_last()->message + "], err=";
         auto line = WaitForSyslog(head, mark, LOG_USER | LOG_ERR);
         ASSERT_TRUE(line.has_value()) << head;
         EXPECT_EQ(0u, line->message.find(head)) << line->message;
@@ -272,12 +277,14 @@ TEST_F(GitStore, TreeEditsNestFoldersDropEmptyOnesAndRenameByEntry) {
     EXPECT_EQ("deleted", back.Contents()["a/b/c"]);
 
     // A rename whose source the base lacks fails the commit: nothing new.
-    mark = SyslogMark();
     std::string count = Git("rev-list --all --count"), strOut = "unchanged";
     Table none, ren(Pairs{{"text/missing", "text/m2"}});
-    EXPECT_EQ(GIT_ENOTFOUND, GitCommit(repo_.c_str(), v2.c_str(), 3000, none.get(), none.get(), ren.get(), "bob",
-                                       "bob@example.com", "{}", strOut));
-    ExpectGitFailure(mark, TESSEL_ERR_NOT_EXISTS, GIT_ENOTFOUND, "git_tree_entry_bypath(&entry, base_tree, szSrc)");
+    ExpectGitFailure(
+        [&] {
+            return GitCommit(repo_.c_str(), v2.c_str(), 3000, none.get(), none.get(), ren.get(), "bob",
+                             "bob@example.com", "{}", strOut);
+        },
+        GIT_ENOTFOUND, TESSEL_ERR_NOT_EXISTS, "git_tree_entry_bypath(&entry, base_tree, szSrc)");
     EXPECT_EQ("unchanged", strOut);
     EXPECT_EQ(count, Git("rev-list --all --count"));
 }
@@ -346,39 +353,31 @@ TEST_F(GitStore, FailuresReportNotFoundAsObjectMissingAndTheRestAsGitFailures) {
                          strOut);
     };
 
-    size_t mark = SyslogMark();
-    EXPECT_EQ(GIT_ENOTFOUND, GitCommit(repo_.c_str(), std::string(40, 'e').c_str(), 2000, none.get(), none.get(),
-                                       none.get(), "bob", "b@x", "{}", strOut));
-    ExpectGitFailure(mark, TESSEL_ERR_NOT_EXISTS, GIT_ENOTFOUND, "git_commit_lookup(&base_commit, repo, &base_commit_id)");
-    mark = SyslogMark();
-    EXPECT_EQ(GIT_ENOTFOUND, GitLoadCommit(repo_.c_str(), "not-an-id", scratch_.file("d").c_str(), jInfo));
-    ExpectGitFailure(mark, TESSEL_ERR_NOT_EXISTS, GIT_ENOTFOUND, "git_commit_lookup(&commit, repo, &commit_id)");
+    ExpectGitFailure([&] { return GitCommit(repo_.c_str(), std::string(40, 'e').c_str(), 2000, none.get(),
+                                            none.get(), none.get(), "bob", "b@x", "{}", strOut); },
+                     GIT_ENOTFOUND, TESSEL_ERR_NOT_EXISTS, "git_commit_lookup(&base_commit, repo, &base_commit_id)");
+    ExpectGitFailure([&] { return GitLoadCommit(repo_.c_str(), "not-an-id", scratch_.file("d").c_str(), jInfo); },
+                     GIT_ENOTFOUND, TESSEL_ERR_NOT_EXISTS, "git_commit_lookup(&commit, repo, &commit_id)");
     EXPECT_FALSE(fs::exists(scratch_.file("d")));
-    mark = SyslogMark();
-    EXPECT_EQ(-1, GitListCommitHistory(src_.c_str(), 0, 0, false, Json::Value(), jOut));
-    ExpectGitFailure(mark, TESSEL_ERR_NOT_EXISTS, GIT_ENOTFOUND, "git_repository_open(&repo, szRepoPath)");
+    ExpectGitFailure([&] { return GitListCommitHistory(src_.c_str(), 0, 0, false, Json::Value(), jOut); }, -1,
+                     TESSEL_ERR_NOT_EXISTS, "git_repository_open(&repo, szRepoPath)", GIT_ENOTFOUND);
     EXPECT_EQ(Json::Value(Json::arrayValue), jOut);
-    mark = SyslogMark();
-    EXPECT_EQ(GIT_ENOTFOUND, commit(missing));
-    ExpectGitFailure(mark, TESSEL_ERR_NOT_EXISTS, GIT_ENOTFOUND, "git_blob_create_fromdisk(&oid_blob, repo, szFile)");
-
+    ExpectGitFailure([&] { return commit(missing); }, GIT_ENOTFOUND, TESSEL_ERR_NOT_EXISTS,
+                     "git_blob_create_fromdisk(&oid_blob, repo, szFile)");
     // A name Git refuses inside a tree; a second first commit.
-    mark = SyslogMark();
-    EXPECT_EQ(GIT_ERROR, commit(dotGit));
-    ExpectGitFailure(mark, TESSEL_ERR_GIT, GIT_ERROR,
+    ExpectGitFailure([&] { return commit(dotGit); }, GIT_ERROR, TESSEL_ERR_GIT,
                      "git_treebuilder_insert(NULL, tree_bld, szEntryName, &oid_blob, GIT_FILEMODE_BLOB )");
-    mark = SyslogMark();
-    EXPECT_EQ(GIT_EMODIFIED,
-              GitCreateRepository(repo_.c_str(), 3000, none.get(), none.get(), "bob", "b@x", "{}", strOut));
-    ExpectGitFailure(mark, TESSEL_ERR_GIT, GIT_EMODIFIED,
-                     "git_commit_create(&commit_id, repo, \"HEAD\", me, me, \"UTF-8\", szCommitMsg, tree, 0, NULL)");
+    ExpectGitFailure(
+        [&] { return GitCreateRepository(repo_.c_str(), 3000, none.get(), none.get(), "bob", "b@x", "{}", strOut); },
+        GIT_EMODIFIED, TESSEL_ERR_GIT,
+        "git_commit_create(&commit_id, repo, \"HEAD\", me, me, \"UTF-8\", szCommitMsg, tree, 0, NULL)");
 
     // A path longer than a path buffer is refused, not cut.
     EXPECT_EQ(GIT_ERROR, commit(tooLong));
     EXPECT_EQ(TESSEL_ERR_USER_INPUT, ErrCode());
     EXPECT_EQ(Msgs{"strlen(szPath) >= 4095"}, ErrMsgs());
 
-    mark = SyslogMark();
+    size_t mark = SyslogMark();
     EXPECT_EQ(GIT_ERROR, GitDiff(repo_.c_str(), "xyz", v1.c_str(), none.get()));
     auto line = WaitForSyslog(" fail to git_oid_fromstr (", mark, LOG_USER | LOG_ERR);
     ASSERT_TRUE(line.has_value());
