@@ -3,15 +3,13 @@
  * its JSON on standard output, the error stack on standard error, its exit
  * codes, the settings file it leaves and the log lines it writes.
  */
-#include <dirent.h>
 #include <fcntl.h>
-#include <string.h>
 #include <grp.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <filesystem>
 #include <set>
 #include <sstream>
 #include <string>
@@ -28,22 +26,27 @@ namespace {
 using tessel_test::Parse;
 using tessel_test::ReadFile;
 using tessel_test::WriteFile;
+using tessel_test::kGidUsers;
+using tessel_test::kUidBob;
 
 const char kConf[] = "/usr/quor/etc/tessel.conf";
+const std::string kUserInput = "ErrNo=[1007] (User input error.)";
+const std::string kNoUser = "ErrNo=[1022] (User not exists.)";
+const std::string kNoOpen = "ErrNo=[1002] (Open File failed.)";
+const std::string kNsDisabled = "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
+                                "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
+                                "  ErrNo=[1012] (Namespace is disabled.)\n";
 
 /* "  frame (module:123)" lines become "  frame (module)": line numbers move with every edit. */
 std::string WithoutLineNumbers(const std::string &text) {
     std::istringstream in(text);
     std::string out;
-    for (std::string line; std::getline(in, line);) {
-        size_t open = line.rfind(" (");
-        size_t colon = line.rfind(':');
-        if (!line.empty() && ')' == line.back() && open != std::string::npos && colon != std::string::npos &&
-            colon > open && colon + 2 < line.size() &&
-            line.find_first_not_of("0123456789", colon + 1) == line.size() - 1) {
+    for (std::string line; std::getline(in, line); out += line + "\n") {
+        const size_t open = line.rfind(" ("), colon = line.rfind(':');
+        if (open != std::string::npos && colon != std::string::npos && colon > open && colon + 2 < line.size() &&
+            ')' == line.back() && line.find_first_not_of("0123456789", colon + 1) == line.size() - 1) {
             line.erase(colon, line.size() - 1 - colon);
         }
-        out += line + "\n";
     }
     return out;
 }
@@ -66,16 +69,15 @@ Result Tessel(const std::vector<std::string> &args, const std::string &stdinText
         ADD_FAILURE() << "no scratch directory";
         return r;
     }
-    pid_t pid = fork();
-    if (0 == pid) {
+    r.code = tessel_test::RunInChild([&]() {
         int in = open(dir.file("in").c_str(), O_RDONLY);
         int out = open(dir.file("out").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0666);
         int err = open(dir.file("err").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0666);
         if (in < 0 || out < 0 || err < 0 || dup2(in, 0) < 0 || dup2(out, 1) < 0 || dup2(err, 2) < 0) {
-            _exit(126);
+            return 126;
         }
         if (0 != uid && (0 != setgroups(0, nullptr) || 0 != setresgid(gid, gid, gid) || 0 != setresuid(uid, uid, uid))) {
-            _exit(126);
+            return 126;
         }
         // A wrapper (a whole command line of its own) runs instead of the tool.
         std::vector<char *> argv;
@@ -87,14 +89,9 @@ Result Tessel(const std::vector<std::string> &args, const std::string &stdinText
         }
         argv.push_back(nullptr);
         execv(argv[0], argv.data());
-        _exit(127);
-    }
-    int status = 0;
-    if (pid < 0 || waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) {
-        ADD_FAILURE() << "the tool did not exit normally";
-        return r;
-    }
-    r.code = WEXITSTATUS(status);
+        return 127;
+    });
+    EXPECT_NE(-1, r.code) << "the tool did not exit normally";
     r.out = ReadFile(dir.file("out"));
     r.err = WithoutLineNumbers(ReadFile(dir.file("err")));
     return r;
@@ -113,7 +110,7 @@ protected:
     }
 };
 
-TEST_F(TesselCli, EveryCommandHasHelpAndWrongCommandLinesExitTwo) {
+TEST_F(TesselCli, EveryCommandHasHelpAndAnUnknownOneIsLogged) {
     Result list = Tessel({"--help"});
     ASSERT_EQ(0, list.code);
     EXPECT_EQ("", list.err);
@@ -148,35 +145,77 @@ TEST_F(TesselCli, EveryCommandHasHelpAndWrongCommandLinesExitTwo) {
     Result bogus = Tessel({"bogus"});
     EXPECT_EQ(2, bogus.code);
     EXPECT_EQ("", bogus.out);
-    EXPECT_EQ(ToolStack("unknown command: bogus", "ErrNo=[1007] (User input error.)") + "Try 'tessel --help'.\n",
-              bogus.err);
+    EXPECT_EQ(ToolStack("unknown command: bogus", kUserInput) + "Try 'tessel --help'.\n", bogus.err);
     auto logged = tessel_test::WaitForSyslog("Failed [unknown command: bogus], err=", mark);
     ASSERT_TRUE(logged.has_value());
     EXPECT_EQ(0u, logged->message.find("tools/tessel:"));
+}
 
-    Result option = Tessel({"settings", "access", "get", "--nss", "demo"});
-    EXPECT_EQ(2, option.code);
-    EXPECT_EQ(ToolStack("unknown option: --nss", "ErrNo=[1007] (User input error.)") +
-                  "Try 'tessel settings access get --help'.\n",
-              option.err);
+// Wrong command lines are the tool's own refusals: exit code 2, nothing on
+// standard output, the tool's frame alone, and nothing written.
+TEST_F(TesselCli, WrongCommandLinesExitTwoWithTheToolsFrame) {
+    struct Case {
+        std::vector<std::string> args;
+        std::string stdinText;
+        unsigned uid;
+        std::string err;
+        bool whole;  // err is all of standard error, not only its start
+    };
+    const std::string notJson = "not JSON in the argument: * Line 1, Column 9   Syntax error: value, object or array expected.";
+    const std::vector<Case> cases = {
+        {{"settings", "access", "get", "--nss", "demo"}, "", 0,
+         ToolStack("unknown option: --nss", kUserInput) + "Try 'tessel settings access get --help'.\n", true},
+        {{"settings", "access", "get", "--ns"}, "", 0, ToolStack("option needs a value: --ns", kUserInput), false},
+        {{"settings", "access", "set", "maybe"}, "", 0, ToolStack("expected on or off: maybe", kUserInput), false},
+        {{"settings", "index", "set", "--ns", "ledger", R"({"text":)"}, "", 0,
+         ToolStack(notJson, kUserInput) + "Try 'tessel settings index set --help'.\n", true},
+        {{"settings", "index", "set", "--ns", "ledger", "-"}, "[1, 2]", 0,
+         ToolStack("not a JSON object in standard input", kUserInput), false},
+        {{"settings", "index", "set", "--ns", "ledger", "-"}, R"({"text": {}, "text": {}})", 0,
+         "tessel call stack:\n  not JSON in standard input: ", false},
+        {{"settings", "index", "set", "--ns", "ledger", "@/tmp/no-such-filter.json"}, "", 0,
+         ToolStack("cannot read /tmp/no-such-filter.json", kNoOpen), false},
+        {{"settings", "access", "get", "--as", "nosuch"}, "", 0, ToolStack("NULL == getpwnam(\"nosuch\")", kNoUser), false},
+        {{"--as", "4242", "settings", "access", "get"}, "", 0, ToolStack("NULL == getpwuid(4242)", kNoUser), false},
+        // A user's own shell can name only itself, by --as or in PARAMS.
+        {{"--as", "alice", "settings", "access", "get"}, "", kUidBob,
+         ToolStack("--as names another user and the caller is not root", kUserInput), false},
+        {{"get", R"({"ns": "ledger", "id": "1001_X", "requester": 1001})"}, "", kUidBob,
+         ToolStack("\"requester\" names another user and the caller is not root", kUserInput), false},
+        {{"get", R"({"field": []})", "--ns", "ledger", "--field", "text"}, "", 0,
+         ToolStack("--field needs \"field\" of PARAMS to be an object", kUserInput), false},
+        {{"reindex", R"({"ns": ""})"}, "", 0, ToolStack("\"ns\" must be a namespace name", kUserInput), false},
+        {{"versions", "list", "--ns", "other", "--id", "1001_X", "--limit", "ten"}, "", 0,
+         ToolStack("--limit needs a number: ten", kUserInput), false},
+        {{"--as", "alice", "set", "--ns", "notes", "--id", "1001_X", "--text", "body"}, "", 0,
+         ToolStack("--text needs NAME=VALUE: body", kUserInput), false},
+    };
+    for (const Case &c : cases) {
+        const std::string line = ::testing::PrintToString(c.args);
+        Result r = Tessel(c.args, c.stdinText, c.uid, c.uid ? kGidUsers : 0);
+        EXPECT_EQ(2, r.code) << line;
+        EXPECT_EQ("", r.out) << line;
+        if (c.whole) {
+            EXPECT_EQ(c.err, r.err) << line;
+        } else {
+            EXPECT_EQ(0u, r.err.find(c.err)) << line << "\n" << r.err;
+        }
+    }
+    EXPECT_NE(0, access(kConf, F_OK));
+}
 
-    Result value = Tessel({"settings", "access", "get", "--ns"});
-    EXPECT_EQ(2, value.code);
-    EXPECT_EQ(0u, value.err.find(ToolStack("option needs a value: --ns", "ErrNo=[1007] (User input error.)")));
-
-    Result word = Tessel({"settings", "access", "set", "maybe"});
-    EXPECT_EQ(2, word.code);
-    EXPECT_EQ(0u, word.err.find(ToolStack("expected on or off: maybe", "ErrNo=[1007] (User input error.)")));
-    EXPECT_NE(0, access(kConf, F_OK));  // nothing was written
+/* Runs the tool as root; checks its exit code and the JSON it printed. */
+Result Json(int code, const std::string &json, const std::vector<std::string> &args) {
+    Result r = Tessel(args);
+    EXPECT_EQ(code, r.code) << ::testing::PrintToString(args) << r.err;
+    EXPECT_EQ(Parse(json), Parse(r.out)) << ::testing::PrintToString(args);
+    return r;
 }
 
 TEST_F(TesselCli, SettingsRoundTripThroughTheFile) {
-    Result off = Tessel({"settings", "access", "get"});
-    EXPECT_EQ(1, off.code);
-    EXPECT_EQ(Parse(R"({"enabled": false, "ns": null})"), Parse(off.out));
     EXPECT_EQ("tessel call stack:\n  FALSE == QLIBCFileExist(SZF_TESSEL_CONF_PATH) (common/tessel_conf)\n"
               "  ErrNo=[1027] (tessel is disabled.)\n",
-              off.err);
+              Json(1, R"({"enabled": false, "ns": null})", {"settings", "access", "get"}).err);
 
     Result store = Tessel({"settings", "access", "set", "on"});
     EXPECT_EQ(0, store.code) << store.err;
@@ -184,86 +223,45 @@ TEST_F(TesselCli, SettingsRoundTripThroughTheFile) {
     Result ns = Tessel({"--compact", "settings", "access", "set", "--ns", "ledger", "--pkg", "LedgerApp", "on"});
     EXPECT_EQ(0, ns.code) << ns.err;
     EXPECT_EQ("{\"enabled\":true,\"ns\":\"ledger\",\"pkg_id\":\"LedgerApp\"}\n", ns.out);
-    Result sharing = Tessel({"settings", "sharing", "set", "--uid", "bob", "--ns", "ledger", "off"});
-    EXPECT_EQ(0, sharing.code) << sharing.err;
-    EXPECT_EQ(Parse(R"({"ns": "ledger", "uid": 1002, "sharing": false})"), Parse(sharing.out));
-    Result index = Tessel({"settings", "index", "set", "--ns", "ledger", R"({"text": {"title": true}, "other": 1})"});
-    EXPECT_EQ(0, index.code) << index.err;
-    EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"text": {"title": true}}})"), Parse(index.out));
+    Json(0, R"({"ns": "ledger", "uid": 1002, "sharing": false})",
+         {"settings", "sharing", "set", "--uid", "bob", "--ns", "ledger", "off"});
+    Json(0, R"({"ns": "ledger", "filter": {"text": {"title": true}}})",
+         {"settings", "index", "set", "--ns", "ledger", R"({"text": {"title": true}, "other": 1})"});
 
-    const Json::Value expected = Parse(R"({"Access": {"enable": true, "enable_ns_ledger": true},
+    const std::string expected = R"({"Access": {"enable": true, "enable_ns_ledger": true},
         "pkg_id": {"ledger": "LedgerApp"}, "Sharing": {"1002": {"disable_ns_ledger": true}},
-        "Index": {"ledger": {"text": {"title": true}}}})");
-    EXPECT_EQ(expected, tessel_test::ReadJson(kConf));
-    Result show = Tessel({"settings", "show", "--ns", "ledger"});
-    EXPECT_EQ(0, show.code);
-    EXPECT_EQ(expected, Parse(show.out));
+        "Index": {"ledger": {"text": {"title": true}}}})";
+    EXPECT_EQ(Parse(expected), tessel_test::ReadJson(kConf));
+    Json(0, expected, {"settings", "show", "--ns", "ledger"});
 
-    Result check = Tessel({"settings", "access", "check", "--ns", "ledger"});
-    EXPECT_EQ(0, check.code);
-    EXPECT_EQ(Parse(R"({"enabled": true, "ns": "ledger"})"), Parse(check.out));
-    EXPECT_EQ("", check.err);
+    EXPECT_EQ("", Json(0, R"({"enabled": true, "ns": "ledger"})", {"settings", "access", "check", "--ns", "ledger"}).err);
     Result other = Tessel({"settings", "access", "check", "--ns", "other"});
     EXPECT_EQ(1, other.code);
-    EXPECT_EQ("tessel call stack:\n"
-              "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
-              "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
-              "  ErrNo=[1012] (Namespace is disabled.)\n",
-              other.err);
+    EXPECT_EQ("tessel call stack:\n" + kNsDisabled, other.err);
 
     // Sharing: the namespace's own switch, then the check of both.
-    Result get = Tessel({"settings", "sharing", "get", "--uid", "1002"});
-    EXPECT_EQ(0, get.code);
-    EXPECT_EQ(Parse(R"({"ns": null, "uid": 1002, "sharing": true})"), Parse(get.out));
-    Result refused = Tessel({"settings", "sharing", "check", "--uid", "bob", "--ns", "ledger"});
-    EXPECT_EQ(1, refused.code);
-    EXPECT_EQ(Parse(R"({"ns": "ledger", "uid": 1002, "sharing": false})"), Parse(refused.out));
+    Json(0, R"({"ns": null, "uid": 1002, "sharing": true})", {"settings", "sharing", "get", "--uid", "1002"});
     EXPECT_EQ("tessel call stack:\n"
               "  FALSE == TesselSettingsSharingGetEx(jConf, szNameSpace, owner) (common/tessel_conf)\n"
               "  jConf[\"Sharing\"][szUid][szNSKey].asBool() (common/tessel_conf)\n"
               "  ErrNo=[1020] (Sharing is not enabled for the object.)\n",
-              refused.err);
-    Result list = Tessel({"settings", "sharing", "off-list", "--ns", "ledger"});
-    EXPECT_EQ(0, list.code);
-    EXPECT_EQ(Parse(R"({"ns": "ledger", "uids": [1002]})"), Parse(list.out));
-    Result filter = Tessel({"settings", "index", "get", "--ns", "ledger"});
-    EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"text": {"title": true}}})"), Parse(filter.out));
+              Json(1, R"({"ns": "ledger", "uid": 1002, "sharing": false})",
+                   {"settings", "sharing", "check", "--uid", "bob", "--ns", "ledger"}).err);
+    Json(0, R"({"ns": "ledger", "uids": [1002]})", {"settings", "sharing", "off-list", "--ns", "ledger"});
+    Json(0, R"({"ns": "ledger", "filter": {"text": {"title": true}}})", {"settings", "index", "get", "--ns", "ledger"});
 }
 
-TEST_F(TesselCli, BadJsonIsRefusedAndNothingIsWritten) {
+TEST_F(TesselCli, AFilterTheLibraryRefusesLeavesTheFileAndAsTakesTheUsersIds) {
     ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
     const std::string before = ReadFile(kConf);
-
-    Result cut = Tessel({"settings", "index", "set", "--ns", "ledger", R"({"text":)"});
-    EXPECT_EQ(2, cut.code);
-    EXPECT_EQ("", cut.out);
-    EXPECT_EQ(ToolStack("not JSON in the argument: * Line 1, Column 9   Syntax error: value, object or array expected.",
-                        "ErrNo=[1007] (User input error.)") +
-                  "Try 'tessel settings index set --help'.\n",
-              cut.err);
-
-    Result array = Tessel({"settings", "index", "set", "--ns", "ledger", "-"}, "[1, 2]");
-    EXPECT_EQ(2, array.code);
-    EXPECT_EQ(0u, array.err.find(ToolStack("not a JSON object in standard input", "ErrNo=[1007] (User input error.)")));
-
-    Result twice = Tessel({"settings", "index", "set", "--ns", "ledger", "-"}, R"({"text": {}, "text": {}})");
-    EXPECT_EQ(2, twice.code);
-    EXPECT_EQ(0u, twice.err.find("tessel call stack:\n  not JSON in standard input: ")) << twice.err;
-
-    Result missing = Tessel({"settings", "index", "set", "--ns", "ledger", "@/tmp/no-such-filter.json"});
-    EXPECT_EQ(2, missing.code);
-    EXPECT_EQ(0u, missing.err.find(ToolStack("cannot read /tmp/no-such-filter.json", "ErrNo=[1002] (Open File failed.)")));
-
-    // A well-formed filter the library refuses: its frames, exit code 1.
+    // Well-formed, but the library refuses it: its frames, exit code 1.
     Result empty = Tessel({"settings", "index", "set", "--ns", "ledger", "{}"});
     EXPECT_EQ(1, empty.code);
     EXPECT_EQ("tessel call stack:\n"
               "  !jsFilter.isMember(\"text\") && !jsFilter.isMember(\"metatext\") (common/tessel_conf)\n",
               empty.err);
     EXPECT_EQ(before, ReadFile(kConf));
-}
 
-TEST_F(TesselCli, AsNamesTheRequesterAndTakesItsIds) {
     // Run as root, --as makes the call with the user's effective ids: the
     // library's raise to root and the way back are logged with them.
     size_t mark = tessel_test::SyslogMark();
@@ -271,60 +269,42 @@ TEST_F(TesselCli, AsNamesTheRequesterAndTakesItsIds) {
     EXPECT_EQ(0, alice.code) << alice.err;
     EXPECT_EQ(Parse(R"({"ns": "ledger", "filter": {"metatext": {}}})"), Parse(alice.out));
     EXPECT_TRUE(tessel_test::WaitForSyslog("WARNING: setresuid(-1, 1001, -1)", mark).has_value());
-
-    Result unknown = Tessel({"settings", "access", "get", "--as", "nosuch"});
-    EXPECT_EQ(2, unknown.code);
-    EXPECT_EQ(0u, unknown.err.find(ToolStack("NULL == getpwnam(\"nosuch\")", "ErrNo=[1022] (User not exists.)")));
-    Result noEntry = Tessel({"--as", "4242", "settings", "access", "get"});
-    EXPECT_EQ(2, noEntry.code);
-    EXPECT_EQ(0u, noEntry.err.find(ToolStack("NULL == getpwuid(4242)", "ErrNo=[1022] (User not exists.)")));
-
-    // A user's own shell can name only itself.
-    Result bob = Tessel({"--as", "alice", "settings", "access", "get"}, "", tessel_test::kUidBob, tessel_test::kGidUsers);
-    EXPECT_EQ(2, bob.code);
-    EXPECT_EQ(0u, bob.err.find(ToolStack("--as names another user and the caller is not root",
-                                         "ErrNo=[1007] (User input error.)")));
 }
 
-TEST_F(TesselCli, GetPassesParametersAndShowsTheLibrarysRefusals) {
+// The library's refusals: exit code 1, nothing on standard output, its frames
+// as they stand, and nothing written.
+TEST_F(TesselCli, GetVersionsAndDownloadShowTheLibrarysRefusals) {
     ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
     ASSERT_EQ(0, Tessel({"settings", "access", "set", "--ns", "ledger", "on"}).code);
-
+    tessel_test::ScratchDir dir;
+    ASSERT_TRUE(dir.ok());
     // A namespace that is off: the read's own frame over the settings' frames.
-    Result off = Tessel({"--as", "alice", "get", "--ns", "other", "--id", "1001_X"});
-    EXPECT_EQ(1, off.code);
-    EXPECT_EQ("", off.out);
-    EXPECT_EQ("tessel call stack:\n"
-              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n"
-              "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
-              "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
-              "  ErrNo=[1012] (Namespace is disabled.)\n",
-              off.err);
-
-    // PARAMS reach the library as given; the options win over them.
-    Result type = Tessel({"--as", "alice", "get", "-"}, R"({"ns": 5, "id": "1001_X"})");
-    EXPECT_EQ(1, type.code);
-    EXPECT_EQ("tessel call stack:\n"
-              "  !jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"id\") || "
-              "!jParm[\"id\"].isString() || !jParm.isMember(\"requester\") || !jParm[\"requester\"].isIntegral() "
-              "(object/object_get)\n"
-              "  ErrNo=[1007] (User input error.)\n",
-              type.err);
-    Result fixed = Tessel({"--as", "alice", "get", R"({"ns": 5, "id": "1001_X"})", "--ns", "other"});
-    EXPECT_EQ(1, fixed.code);
-    EXPECT_EQ(off.err, fixed.err);
-
-    Result field = Tessel({"get", R"({"field": []})", "--ns", "ledger", "--field", "text"});
-    EXPECT_EQ(2, field.code);
-    EXPECT_EQ(0u, field.err.find(ToolStack("--field needs \"field\" of PARAMS to be an object",
-                                           "ErrNo=[1007] (User input error.)")));
-
-    // A user's shell cannot read for another user by naming them in PARAMS.
-    Result bob = Tessel({"get", R"({"ns": "ledger", "id": "1001_X", "requester": 1001})"}, "", tessel_test::kUidBob,
-                        tessel_test::kGidUsers);
-    EXPECT_EQ(2, bob.code);
-    EXPECT_EQ(0u, bob.err.find(ToolStack("\"requester\" names another user and the caller is not root",
-                                         "ErrNo=[1007] (User input error.)")));
+    const std::string getFrames =
+        "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n" + kNsDisabled;
+    const std::string off = "tessel call stack:\n" + getFrames;
+    const std::vector<std::pair<std::vector<std::string>, std::string>> cases = {
+        {{"--as", "alice", "get", "--ns", "other", "--id", "1001_X"}, off},
+        // PARAMS reach the library as given; the options win over them.
+        {{"--as", "alice", "get", "-"},
+         "tessel call stack:\n"
+         "  !jParm.isMember(\"ns\") || !jParm[\"ns\"].isString() || !jParm.isMember(\"id\") || "
+         "!jParm[\"id\"].isString() || !jParm.isMember(\"requester\") || !jParm[\"requester\"].isIntegral() "
+         "(object/object_get)\n  " + kUserInput + "\n"},
+        {{"--as", "alice", "get", R"({"ns": 5, "id": "1001_X"})", "--ns", "other"}, off},
+        {{"--as", "alice", "versions", "list", "--ns", "other", "--id", "1001_X"},
+         "tessel call stack:\n"
+         "  0 > (count = TesselObjectVersionList(jParm, &pHead, total, listable_total)) (version/version_list)\n"
+         "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (version/version_list)\n" + kNsDisabled},
+        {{"--as", "alice", "download", "--ns", "other", "--id", "1001_X", "--name", "a.txt", "--output", dir.file("a.txt")},
+         "tessel call stack:\n  !tmpObj.Get(jGetParm) (object/object_download)\n" + getFrames},
+    };
+    for (const auto &c : cases) {
+        Result r = Tessel(c.first, R"({"ns": 5, "id": "1001_X"})");
+        EXPECT_EQ(1, r.code) << ::testing::PrintToString(c.first);
+        EXPECT_EQ("", r.out) << ::testing::PrintToString(c.first);
+        EXPECT_EQ(c.second, r.err) << ::testing::PrintToString(c.first);
+    }
+    EXPECT_NE(0, access(dir.file("a.txt").c_str(), F_OK));
 }
 
 TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATerminal) {
@@ -361,39 +341,6 @@ TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATermin
     EXPECT_EQ(0, tty.code);
     EXPECT_EQ("\rreindex notes [" + std::string(40, '#') + "] 0/0\r\n{\"indexed\":0,\"ns\":\"notes\",\"stored\":0}\r\n",
               tty.out.substr(tty.out.rfind("\rreindex notes [")));
-
-    Result empty = Tessel({"reindex", R"({"ns": ""})"});
-    EXPECT_EQ(2, empty.code);
-    EXPECT_EQ(0u, empty.err.find(ToolStack("\"ns\" must be a namespace name", "ErrNo=[1007] (User input error.)")));
-}
-
-TEST_F(TesselCli, VersionsAndDownloadShowTheLibrarysRefusalsAndWriteNothing) {
-    ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
-    const std::string disabled = "  FALSE == TesselSettingsAccessGetEx(jConf, szNameSpace) (common/tessel_conf)\n"
-                                 "  !jConf[\"Access\"].isMember(szNSKey) (common/tessel_conf)\n"
-                                 "  ErrNo=[1012] (Namespace is disabled.)\n";
-    Result list = Tessel({"--as", "alice", "versions", "list", "--ns", "other", "--id", "1001_X"});
-    EXPECT_EQ(1, list.code);
-    EXPECT_EQ("", list.out);
-    EXPECT_EQ("tessel call stack:\n"
-              "  0 > (count = TesselObjectVersionList(jParm, &pHead, total, listable_total)) (version/version_list)\n"
-              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (version/version_list)\n" + disabled,
-              list.err);
-    Result limit = Tessel({"versions", "list", "--ns", "other", "--id", "1001_X", "--limit", "ten"});
-    EXPECT_EQ(2, limit.code);
-    EXPECT_EQ(0u, limit.err.find(ToolStack("--limit needs a number: ten", "ErrNo=[1007] (User input error.)")));
-
-    tessel_test::ScratchDir dir;
-    ASSERT_TRUE(dir.ok());
-    Result download = Tessel({"--as", "alice", "download", "--ns", "other", "--id", "1001_X", "--name", "a.txt",
-                              "--output", dir.file("a.txt")});
-    EXPECT_EQ(1, download.code);
-    EXPECT_EQ("", download.out);
-    EXPECT_EQ("tessel call stack:\n"
-              "  !tmpObj.Get(jGetParm) (object/object_download)\n"
-              "  FALSE == TesselAccessCheck(jParm[\"ns\"].asCString()) (object/object_get)\n" + disabled,
-              download.err);
-    EXPECT_NE(0, access(dir.file("a.txt").c_str(), F_OK));
 }
 
 /* A namespace "notes" switched on and placed on the volume of its package. */
@@ -405,16 +352,11 @@ void PlaceNotes() {
     ASSERT_EQ(0, Tessel({"namespace", "create", "--ns", "notes"}).code);
 }
 
-/* The entries of a directory but "." and "..", sorted. */
+/* The entries of a directory, sorted. */
 std::vector<std::string> Entries(const std::string &dir) {
     std::vector<std::string> names;
-    if (DIR *d = opendir(dir.c_str())) {
-        while (struct dirent *e = readdir(d)) {
-            if (0 != strcmp(e->d_name, ".") && 0 != strcmp(e->d_name, "..")) {
-                names.push_back(e->d_name);
-            }
-        }
-        closedir(d);
+    for (const auto &e : std::filesystem::directory_iterator(dir)) {
+        names.push_back(e.path().filename().string());
     }
     std::sort(names.begin(), names.end());
     return names;
@@ -469,8 +411,8 @@ TEST_F(TesselCli, CreatePrintsTheStoredObjectAndARefusedCreateLeavesNothing) {
     Result secret = Tessel({"--as", "alice", "create", "--ns", "notes", "--category", "note", "--binary",
                             "s.txt=" + dir.file("secret.txt")});
     EXPECT_EQ(2, secret.code);
-    EXPECT_EQ(ToolStack("cannot read " + dir.file("secret.txt") + " as a regular file",
-                        "ErrNo=[1002] (Open File failed.)") + "Try 'tessel create --help'.\n",
+    EXPECT_EQ(ToolStack("cannot read " + dir.file("secret.txt") + " as a regular file", kNoOpen) +
+                  "Try 'tessel create --help'.\n",
               secret.err);
     // bob cannot create under alice's object.
     Result child = Tessel({"--as", "bob", "create", "--ns", "notes", "--category", "note", "--parent", id});
@@ -513,10 +455,6 @@ TEST_F(TesselCli, SetMakesVersionsOnTheLatestAndARefusedSetChangesNothing) {
     EXPECT_EQ(1, bob.code);
     EXPECT_EQ("", bob.out);
     EXPECT_NE(std::string::npos, bob.err.find("  ErrNo=[1020] (Sharing is not enabled for the object.)\n")) << bob.err;
-    Result wrong = Tessel({"--as", "alice", "set", "--ns", "notes", "--id", id, "--text", "body"});
-    EXPECT_EQ(2, wrong.code);
-    EXPECT_EQ(0u, wrong.err.find(ToolStack("--text needs NAME=VALUE: body", "ErrNo=[1007] (User input error.)")))
-        << wrong.err;
 
     Result versions = Tessel({"--as", "alice", "versions", "list", "--ns", "notes", "--id", id});
     ASSERT_EQ(0, versions.code) << versions.err;
