@@ -14,6 +14,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -207,9 +208,8 @@ protected:
 TEST_F(MetaBinary, SaveStoresDescribesCopiesAndDeletes) {
     const std::string strId = Create();
     const std::string strOther = Create();
-    Json::Value jFiles(Json::arrayValue);
-    jFiles.append(Upload("photo.png", "raw", std::string("\x89PNG\0\r\n", 7)));
-    jFiles.append(Upload("note.txt", "base64", "aGVs\nbG8=\n"));
+    const Json::Value jFiles =
+        Items({Upload("photo.png", "raw", std::string("\x89PNG\0\r\n", 7)), Upload("note.txt", "base64", "aGVs\nbG8=\n")});
     const long long before = time(NULL);
     ASSERT_TRUE(Save(strId, jFiles)) << ::testing::PrintToString(ErrMsgs());
     const long long after = time(NULL);
@@ -230,8 +230,7 @@ TEST_F(MetaBinary, SaveStoresDescribesCopiesAndDeletes) {
               ReadJson(InfoPath(strId, "note.txt")));
     // Whole files only: no temporary left beside them, no work area left in
     // the namespace's scratch directory.
-    const Msgs stored = {Encoded("note.txt"), Encoded("photo.png")};
-    Msgs sorted = stored;
+    Msgs sorted = {Encoded("note.txt"), Encoded("photo.png")};
     std::sort(sorted.begin(), sorted.end());
     EXPECT_EQ(sorted, Entries(kNsDir + "/" + strId + "/metabinary"));
     EXPECT_EQ(sorted, Entries(kNsDir + "/" + strId + "/metabinary_info"));
@@ -337,11 +336,8 @@ TEST_F(MetaBinary, BadItemsAreRefusedWithTheirCondition) {
 
 TEST_F(MetaBinary, DownloadWritesTheGatewayResponse) {
     const std::string strId = Create();
-    Json::Value jFiles(Json::arrayValue);
-    jFiles.append(Upload("four.txt", "raw", "abcd"));
-    jFiles.append(Upload("résumé 1.txt", "raw", "cv"));
-    jFiles.append(Upload("empty.bin", "raw", ""));
-    ASSERT_TRUE(Save(strId, jFiles)) << ::testing::PrintToString(ErrMsgs());
+    ASSERT_TRUE(Save(strId, Items({Upload("four.txt", "raw", "abcd"), Upload("résumé 1.txt", "raw", "cv"),
+                                   Upload("empty.bin", "raw", "")}))) << ::testing::PrintToString(ErrMsgs());
     const std::string strMd5 = Md5Of(DataPath(strId, "four.txt"));
     auto req = [&](const std::string &strField, const std::string &strFormat, const std::string &strMore = "") {
         Json::Value jParm = Req(strId, R"("segment": "metabinary", "requester": 1001)" + strMore);
@@ -374,29 +370,25 @@ TEST_F(MetaBinary, DownloadWritesTheGatewayResponse) {
     EXPECT_LE(before, timegm(&tmExpires));
     EXPECT_GE(after, timegm(&tmExpires));
 
-    // Raw: the attachment and extra headers, then the file output's own.
-    resp = Download(req("four.txt", "raw"));
-    ASSERT_TRUE(resp.ok) << tessel::toString(resp.stack);
-    EXPECT_EQ("Content-Type: text/plain\r\nContent-Length: 4\r\n\r\nabcd", resp.out);
-
-    // The client's copy is current: 304 and nothing else, whatever the format.
-    resp = Download(req("four.txt", "zip"), {{"HTTP_IF_NONE_MATCH", strMd5}});
-    ASSERT_TRUE(resp.ok) << tessel::toString(resp.stack);
-    EXPECT_EQ("Status: 304 Not Modified\r\n\r\n", resp.out);
-
-    // The attachment name: URL-encoded for the older browsers only.
-    const std::string strCvParm = R"(, "mode": "download")";
-    resp = Download(req("résumé 1.txt", "raw", strCvParm),
-                    {{"HTTP_USER_AGENT", "Mozilla/5.0 (Windows NT 10.0; Trident/7.0; rv:11.0) like Gecko"}});
-    ASSERT_TRUE(resp.ok) << tessel::toString(resp.stack);
-    EXPECT_EQ("Content-Disposition:attachment; filename=\"r%C3%A9sum%C3%A9%201.txt\"\r\n"
-              "Content-Type: text/plain\r\nContent-Length: 2\r\n\r\ncv",
-              resp.out);
-    resp = Download(req("résumé 1.txt", "raw", strCvParm), {{"HTTP_USER_AGENT", "Mozilla/5.0 (X11; Linux) Firefox/120"}});
-    ASSERT_TRUE(resp.ok) << tessel::toString(resp.stack);
-    EXPECT_EQ("Content-Disposition:attachment; filename=\"résumé 1.txt\"\r\n"
-              "Content-Type: text/plain\r\nContent-Length: 2\r\n\r\ncv",
-              resp.out);
+    // Raw: the attachment and extra headers, then the file output's own. A
+    // client whose copy is current gets 304 and nothing else, whatever the
+    // format. The attachment name is URL-encoded for the older browsers only.
+    const std::string strCv = "Content-Type: text/plain\r\nContent-Length: 2\r\n\r\ncv";
+    const std::vector<std::tuple<Json::Value, std::map<std::string, std::string>, std::string>> served = {
+        {req("four.txt", "raw"), {}, "Content-Type: text/plain\r\nContent-Length: 4\r\n\r\nabcd"},
+        {req("four.txt", "zip"), {{"HTTP_IF_NONE_MATCH", strMd5}}, "Status: 304 Not Modified\r\n\r\n"},
+        {req("résumé 1.txt", "raw", R"(, "mode": "download")"),
+         {{"HTTP_USER_AGENT", "Mozilla/5.0 (Windows NT 10.0; Trident/7.0; rv:11.0) like Gecko"}},
+         "Content-Disposition:attachment; filename=\"r%C3%A9sum%C3%A9%201.txt\"\r\n" + strCv},
+        {req("résumé 1.txt", "raw", R"(, "mode": "download")"),
+         {{"HTTP_USER_AGENT", "Mozilla/5.0 (X11; Linux) Firefox/120"}},
+         "Content-Disposition:attachment; filename=\"résumé 1.txt\"\r\n" + strCv},
+    };
+    for (const auto &c : served) {
+        resp = Download(std::get<0>(c), std::get<1>(c));
+        EXPECT_TRUE(resp.ok) << tessel::toString(resp.stack);
+        EXPECT_EQ(std::get<2>(c), resp.out);
+    }
 
     // Failures: nothing printed, the condition on the stack, the log line.
     const Msgs tail = {"!mf_DownloadBinaryByDir(strBinaryDir, strBinaryInfoDir)", "!mf_DownloadMetaBinary()"};
@@ -413,35 +405,27 @@ TEST_F(MetaBinary, DownloadWritesTheGatewayResponse) {
     ASSERT_TRUE(line.has_value());
     EXPECT_EQ(0u, line->message.find("backend_fs/utils:"));
 
-    resp = Download(req("empty.bin", "base64"));
-    EXPECT_FALSE(resp.ok);
-    EXPECT_EQ("", resp.out);
-    EXPECT_EQ(TESSEL_ERR_READ_FILE, resp.stack[0]["code"].asInt());
-    EXPECT_EQ((Msgs{"size == 0",
-                    "!OpenBinaryAndPrint(blBase64, strBinaryFilePath, strFileName, strEtag, blAttachment, "
-                    "m_jParm[\"headers\"])",
-                    tail[0], tail[1]}),
-              FrameMsgs(resp.stack));
-
-    resp = Download(req("gone.txt", "raw"));
-    EXPECT_FALSE(resp.ok);
-    EXPECT_EQ(TESSEL_ERR_UNEXPECTED, resp.stack[0]["code"].asInt());
-    EXPECT_EQ((Msgs{"!QLIBCFileExist(strBinaryFilePath.c_str())", tail[0], tail[1]}), FrameMsgs(resp.stack));
-
-    resp = Download(req("four.txt", "raw", R"(, "headers": {"X-Bad": "a\r\nSet-Cookie: x"})"));
-    EXPECT_FALSE(resp.ok);
-    EXPECT_EQ("", resp.out);
-    EXPECT_EQ((Msgs{"bad header [X-Bad]",
-                    "!OpenBinaryAndPrint(blBase64, strBinaryFilePath, strFileName, strEtag, blAttachment, "
-                    "m_jParm[\"headers\"])",
-                    tail[0], tail[1]}),
-              FrameMsgs(resp.stack));
-
-    jParm = req("four.txt", "raw");
-    jParm.removeMember("field");
-    resp = Download(jParm);
-    EXPECT_EQ(TESSEL_ERR_BAD_PARAMETERS, resp.stack[0]["code"].asInt());
-    EXPECT_EQ((Msgs{"!m_jParm.isMember(\"field\")", tail[0], tail[1]}), FrameMsgs(resp.stack));
+    const std::string openPrint = "!OpenBinaryAndPrint(blBase64, strBinaryFilePath, strFileName, strEtag, "
+                                  "blAttachment, m_jParm[\"headers\"])";
+    Json::Value jNoField = req("four.txt", "raw");
+    jNoField.removeMember("field");
+    Json::Value jNoSegment = req("four.txt", "raw");
+    jNoSegment.removeMember("segment");
+    const std::vector<std::tuple<Json::Value, int, Msgs>> failures = {
+        {req("empty.bin", "base64"), TESSEL_ERR_READ_FILE, {"size == 0", openPrint, tail[0], tail[1]}},
+        {req("gone.txt", "raw"), TESSEL_ERR_UNEXPECTED, {"!QLIBCFileExist(strBinaryFilePath.c_str())", tail[0], tail[1]}},
+        {req("four.txt", "raw", R"(, "headers": {"X-Bad": "a\r\nSet-Cookie: x"})"), TESSEL_ERR_BAD_PARAMETERS,
+         {"bad header [X-Bad]", openPrint, tail[0], tail[1]}},
+        {jNoField, TESSEL_ERR_BAD_PARAMETERS, {"!m_jParm.isMember(\"field\")", tail[0], tail[1]}},
+        {jNoSegment, TESSEL_ERR_BAD_PARAMETERS, {"!jParm.isMember(\"segment\")"}},
+    };
+    for (const auto &f : failures) {
+        resp = Download(std::get<0>(f));
+        EXPECT_FALSE(resp.ok) << std::get<2>(f)[0];
+        EXPECT_EQ("", resp.out) << std::get<2>(f)[0];
+        EXPECT_EQ(std::get<1>(f), resp.stack[0]["code"].asInt()) << std::get<2>(f)[0];
+        EXPECT_EQ(std::get<2>(f), FrameMsgs(resp.stack));
+    }
 
     mark = SyslogMark();
     jParm = req("four.txt", "raw");
@@ -450,14 +434,7 @@ TEST_F(MetaBinary, DownloadWritesTheGatewayResponse) {
     EXPECT_FALSE(resp.ok);
     EXPECT_EQ(TESSEL_ERR_BAD_PARAMETERS, resp.stack[0]["code"].asInt());
     ASSERT_TRUE(WaitForSyslog("segment error, jParm=" + tessel::toString(jParm), mark, LOG_USER | LOG_ERR));
-    jParm.removeMember("segment");
-    resp = Download(jParm);
-    EXPECT_EQ((Msgs{"!jParm.isMember(\"segment\")"}), FrameMsgs(resp.stack));
 }
-
-}  // namespace
-
-namespace {
 
 // The web handlers' entry: the request from a string hash, checked before
 // anything is read.
@@ -475,12 +452,10 @@ TEST(ObjectDownload, RequestsAreCheckedBeforeAnyRead) {
                   ErrMsgs());
         ASSERT_LE(0, QLIBCSzHashSetValue(hash.get(), kv.first, kv.second));
     }
-    for (const std::pair<const char *, const char *> &bad :
-         std::vector<std::pair<const char *, const char *>>{{"", "!isdigit(pParm[0])"},
-                                                            {"-1", "!isdigit(pParm[0])"},
-                                                            {" 1", "!isdigit(pParm[0])"},
-                                                            {"1001x", "endPtr && *endPtr"},
-                                                            {"4294967296", "requester > UID_ERR"}}) {
+    const std::vector<std::pair<const char *, const char *>> badRequesters = {
+        {"", "!isdigit(pParm[0])"}, {"-1", "!isdigit(pParm[0])"}, {" 1", "!isdigit(pParm[0])"},
+        {"1001x", "endPtr && *endPtr"}, {"4294967296", "requester > UID_ERR"}};
+    for (const auto &bad : badRequesters) {
         ASSERT_LE(0, QLIBCSzHashSetValue(hash.get(), "requester", bad.first));
         ErrClear();
         EXPECT_FALSE(TesselObjectDownload(hash.get())) << bad.first;
