@@ -17,6 +17,7 @@
 #include <memory>
 #include <sstream>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -37,28 +38,28 @@ using Lines = std::vector<std::string>;
 const std::string kNsDir = "/volume1/@Tessel/ledger";
 const char kConf[] = "/usr/quor/etc/tessel.conf";
 
-// A port nobody listens on right now.
-int FreePort() {
-    const int fd = socket(AF_INET, SOCK_STREAM, 0);
-    struct sockaddr_in addr = {};
-    addr.sin_family = AF_INET;
-    addr.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    socklen_t len = sizeof(addr);
-    int port = -1;
-    if (fd >= 0 && 0 == bind(fd, reinterpret_cast<sockaddr *>(&addr), sizeof(addr)) &&
-        0 == getsockname(fd, reinterpret_cast<sockaddr *>(&addr), &len)) {
-        port = ntohs(addr.sin_port);
-    }
-    close(fd);
-    return port;
-}
-
-bool Accepts(int port) {
-    const int fd = socket(AF_INET, SOCK_STREAM, 0);
+struct sockaddr_in Loopback(int port) {
     struct sockaddr_in addr = {};
     addr.sin_family = AF_INET;
     addr.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
     addr.sin_port = htons(static_cast<uint16_t>(port));
+    return addr;
+}
+
+// A port nobody listens on right now.
+int FreePort() {
+    const int fd = socket(AF_INET, SOCK_STREAM, 0);
+    struct sockaddr_in addr = Loopback(0);
+    socklen_t len = sizeof(addr);
+    const bool ok = fd >= 0 && 0 == bind(fd, reinterpret_cast<sockaddr *>(&addr), sizeof(addr)) &&
+                    0 == getsockname(fd, reinterpret_cast<sockaddr *>(&addr), &len);
+    close(fd);
+    return ok ? ntohs(addr.sin_port) : -1;
+}
+
+bool Accepts(int port) {
+    const int fd = socket(AF_INET, SOCK_STREAM, 0);
+    struct sockaddr_in addr = Loopback(port);
     const bool ok = fd >= 0 && 0 == connect(fd, reinterpret_cast<sockaddr *>(&addr), sizeof(addr));
     close(fd);
     return ok;
@@ -106,15 +107,9 @@ protected:
         }
         // Until the server listens (it may also have died: then stop asking).
         bool up = false;
-        for (int i = 0; i < 500 && !up; ++i) {
-            up = Accepts(port_);
-            if (!up && 0 != waitpid(server_, NULL, WNOHANG)) {
-                break;
-            }
-            if (!up) {
-                struct timespec pause = {0, 10 * 1000 * 1000};
-                nanosleep(&pause, NULL);
-            }
+        for (int i = 0; i < 500 && !(up = Accepts(port_)) && 0 == waitpid(server_, NULL, WNOHANG); ++i) {
+            struct timespec pause = {0, 10 * 1000 * 1000};
+            nanosleep(&pause, NULL);
         }
         ASSERT_TRUE(up) << ReadFile(dir_.file("error.log"));
     }
@@ -235,15 +230,16 @@ TEST_F(DownloadCgi, ServesStoredFilesThroughTheWebServer) {
 
     // Refusals: bob holds no word on alice's shared object; a request without a
     // file name; a file the object does not have.
-    f = Fetch("bob:bob-pw", strBase + "&field=four.txt&format=raw");
-    EXPECT_EQ("HTTP/1.1 403 Forbidden", f.status);
-    EXPECT_EQ("error 1023\n", f.body);
-    f = Fetch("alice:alice-pw", strBase + "&format=raw");
-    EXPECT_EQ("HTTP/1.1 400 Bad Request", f.status);
-    EXPECT_EQ("error 1007\n", f.body);
-    f = Fetch("alice:alice-pw", strBase + "&field=none.txt&format=raw");
-    EXPECT_EQ("HTTP/1.1 404 Not Found", f.status);
-    EXPECT_EQ("error 1016\n", f.body);
+    const std::vector<std::tuple<std::string, std::string, std::string, std::string>> refusals = {
+        {"bob:bob-pw", "&field=four.txt&format=raw", "HTTP/1.1 403 Forbidden", "error 1023\n"},
+        {"alice:alice-pw", "&format=raw", "HTTP/1.1 400 Bad Request", "error 1007\n"},
+        {"alice:alice-pw", "&field=none.txt&format=raw", "HTTP/1.1 404 Not Found", "error 1016\n"},
+    };
+    for (const auto &r : refusals) {
+        f = Fetch(std::get<0>(r), strBase + std::get<1>(r));
+        EXPECT_EQ(std::get<2>(r), f.status) << std::get<1>(r);
+        EXPECT_EQ(std::get<3>(r), f.body) << std::get<1>(r);
+    }
 }
 
 }  // namespace
