@@ -166,7 +166,6 @@ protected:
         EXPECT_TRUE(dir.ok());
         const std::string strOut = dir.file("stdout");
         const std::string strStack = dir.file("stack");
-        Response resp;
         const int rc = RunInChild([&]() {
             unsetenv("HTTP_IF_NONE_MATCH");
             unsetenv("HTTP_USER_AGENT");
@@ -185,10 +184,7 @@ protected:
             return tessel::toFile(TesselErrMsgGet(), strStack) ? (ok ? 0 : 1) : 98;
         });
         EXPECT_TRUE(0 == rc || 1 == rc) << rc;
-        resp.ok = 0 == rc;
-        resp.out = ReadFile(strOut);
-        resp.stack = ReadJson(strStack);
-        return resp;
+        return {0 == rc, ReadFile(strOut), ReadJson(strStack)};
     }
 
     static Msgs FrameMsgs(const Json::Value &jStack) {

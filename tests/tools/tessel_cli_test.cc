@@ -10,6 +10,7 @@
 
 #include <algorithm>
 #include <filesystem>
+#include <iterator>
 #include <set>
 #include <sstream>
 #include <string>
@@ -102,6 +103,10 @@ std::string ToolStack(const std::string &condition, const std::string &errNo) {
     return "tessel call stack:\n  " + condition + " (tools/tessel)\n  " + errNo + "\n";
 }
 
+/* The package NotesApp, installed on the second volume. */
+const char kInstallNotesApp[] = "mkdir -p /volume2/@appstore/NotesApp /var/packages/NotesApp && "
+                                "ln -sfn /volume2/@appstore/NotesApp /var/packages/NotesApp/target";
+
 class TesselCli : public ::testing::Test {
 protected:
     void SetUp() override {
@@ -123,13 +128,8 @@ TEST_F(TesselCli, EveryCommandHasHelpAndAnUnknownOneIsLogged) {
         }
         const std::string name = text.substr(2, text.find("  ", 2) - 2);
         ++commands;
-        std::vector<std::string> args;
-        std::istringstream words(name);
-        for (std::string w; words >> w;) {
-            args.push_back(w);
-        }
-        args.push_back("--help");
-        Result help = Tessel(args);
+        std::istringstream words(name + " --help");
+        Result help = Tessel({std::istream_iterator<std::string>(words), std::istream_iterator<std::string>()});
         EXPECT_EQ(0, help.code) << name;
         EXPECT_EQ(0u, help.out.find("Usage: tessel " + name + " ")) << help.out;
         EXPECT_NE(std::string::npos, help.out.find("  --as UID|NAME ")) << help.out;
@@ -204,6 +204,14 @@ TEST_F(TesselCli, WrongCommandLinesExitTwoWithTheToolsFrame) {
     EXPECT_NE(0, access(kConf, F_OK));
 }
 
+/* Runs the tool as root; checks its exit code and exactly what it printed. */
+Result Text(int code, const std::string &out, const std::vector<std::string> &args) {
+    Result r = Tessel(args);
+    EXPECT_EQ(code, r.code) << ::testing::PrintToString(args) << r.err;
+    EXPECT_EQ(out, r.out) << ::testing::PrintToString(args);
+    return r;
+}
+
 /* Runs the tool as root; checks its exit code and the JSON it printed. */
 Result Json(int code, const std::string &json, const std::vector<std::string> &args) {
     Result r = Tessel(args);
@@ -217,12 +225,9 @@ TEST_F(TesselCli, SettingsRoundTripThroughTheFile) {
               "  ErrNo=[1027] (tessel is disabled.)\n",
               Json(1, R"({"enabled": false, "ns": null})", {"settings", "access", "get"}).err);
 
-    Result store = Tessel({"settings", "access", "set", "on"});
-    EXPECT_EQ(0, store.code) << store.err;
-    EXPECT_EQ("{\n  \"enabled\" : true,\n  \"ns\" : null\n}\n", store.out);
-    Result ns = Tessel({"--compact", "settings", "access", "set", "--ns", "ledger", "--pkg", "LedgerApp", "on"});
-    EXPECT_EQ(0, ns.code) << ns.err;
-    EXPECT_EQ("{\"enabled\":true,\"ns\":\"ledger\",\"pkg_id\":\"LedgerApp\"}\n", ns.out);
+    Text(0, "{\n  \"enabled\" : true,\n  \"ns\" : null\n}\n", {"settings", "access", "set", "on"});
+    Text(0, "{\"enabled\":true,\"ns\":\"ledger\",\"pkg_id\":\"LedgerApp\"}\n",
+         {"--compact", "settings", "access", "set", "--ns", "ledger", "--pkg", "LedgerApp", "on"});
     Json(0, R"({"ns": "ledger", "uid": 1002, "sharing": false})",
          {"settings", "sharing", "set", "--uid", "bob", "--ns", "ledger", "off"});
     Json(0, R"({"ns": "ledger", "filter": {"text": {"title": true}}})",
@@ -318,21 +323,15 @@ TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATermin
               nowhere.err);
 
     // The package's target decides the volume.
-    ASSERT_EQ(0, system("mkdir -p /volume2/@appstore/NotesApp /var/packages/NotesApp && "
-                        "ln -sfn /volume2/@appstore/NotesApp /var/packages/NotesApp/target"));
-    Result placed = Tessel({"--compact", "namespace", "create", "--ns", "notes", "--pkg", "NotesApp"});
-    EXPECT_EQ(0, placed.code) << placed.err;
-    EXPECT_EQ("{\"ns\":\"notes\",\"path\":\"/volume2/@Tessel/notes\"}\n", placed.out);
-    Result path = Tessel({"--compact", "namespace", "path", "--ns", "notes"});
-    EXPECT_EQ(placed.out, path.out);
+    ASSERT_EQ(0, system(kInstallNotesApp));
+    const std::string placed = "{\"ns\":\"notes\",\"path\":\"/volume2/@Tessel/notes\"}\n";
+    Text(0, placed, {"--compact", "namespace", "create", "--ns", "notes", "--pkg", "NotesApp"});
+    Text(0, placed, {"--compact", "namespace", "path", "--ns", "notes"});
     struct stat st;
     ASSERT_EQ(0, stat("/volume2/@Tessel/notes", &st));
     EXPECT_EQ(0700u, st.st_mode & 07777);
 
-    Result quiet = Tessel({"--compact", "reindex", "--ns", "notes"});
-    EXPECT_EQ(0, quiet.code) << quiet.err;
-    EXPECT_EQ("{\"indexed\":0,\"ns\":\"notes\",\"stored\":0}\n", quiet.out);
-    EXPECT_EQ("", quiet.err);
+    EXPECT_EQ("", Text(0, "{\"indexed\":0,\"ns\":\"notes\",\"stored\":0}\n", {"--compact", "reindex", "--ns", "notes"}).err);
 
     // On a terminal (a pseudo-terminal from script(1)) the bar is drawn on
     // standard error, and its line ended before the result.
@@ -347,8 +346,7 @@ TEST_F(TesselCli, NamespaceIsPlacedByItsPackageAndReindexedWithProgressOnATermin
 void PlaceNotes() {
     ASSERT_EQ(0, Tessel({"settings", "access", "set", "on"}).code);
     ASSERT_EQ(0, Tessel({"settings", "access", "set", "--ns", "notes", "--pkg", "NotesApp", "on"}).code);
-    ASSERT_EQ(0, system("mkdir -p /volume2/@appstore/NotesApp /var/packages/NotesApp && "
-                        "ln -sfn /volume2/@appstore/NotesApp /var/packages/NotesApp/target"));
+    ASSERT_EQ(0, system(kInstallNotesApp));
     ASSERT_EQ(0, Tessel({"namespace", "create", "--ns", "notes"}).code);
 }
 
@@ -419,18 +417,13 @@ TEST_F(TesselCli, CreatePrintsTheStoredObjectAndARefusedCreateLeavesNothing) {
     EXPECT_EQ(1, child.code);
     EXPECT_EQ("", child.out);
     EXPECT_EQ(stored, Entries("/volume2/@Tessel/notes"));
-    std::vector<std::string> scratch;
     for (const std::string &name : Entries("/tmp")) {
-        if (0 == name.rfind("tessel-attach-", 0)) {
-            scratch.push_back(name);
-        }
+        EXPECT_NE(0u, name.rfind("tessel-attach-", 0)) << "left behind: " << name;
     }
-    EXPECT_EQ(std::vector<std::string>(), scratch);
     Result read = Tessel({"--as", "alice", "get", "--ns", "notes", "--id", id});
     ASSERT_EQ(0, read.code) << read.err;
-    Json::Value again = Parse(read.out);
     expected.removeMember("person");  // a read shows persons only when asked for them
-    EXPECT_EQ(expected, again);
+    EXPECT_EQ(expected, Parse(read.out));
 }
 
 TEST_F(TesselCli, SetMakesVersionsOnTheLatestAndARefusedSetChangesNothing) {
