@@ -5,6 +5,7 @@
 #include <new>
 #include <string>
 
+#include "common/tessel_record_fields.h"
 #include "common/tessel_report.h"
 #include "tesselobjectversion.h"
 
@@ -21,31 +22,6 @@ struct TESSEL_OBJECT_VERSION_PRIVATE {
     Json::Value last_version{Json::arrayValue};
     Json::Value extra_info;
 };
-
-namespace {
-
-const std::string &EmptyText() {
-    static const std::string strEmpty;
-    return strEmpty;
-}
-
-const Json::Value &NullJson() {
-    static const Json::Value jNull;
-    return jNull;
-}
-
-// Json::Value::clear() throws on a scalar; a scalar has nothing to keep, so
-// it goes back to null. Arrays and objects keep their type, as an object
-// record's JSON fields do on a reset.
-void Empty(Json::Value &jField) {
-    if (jField.isArray() || jField.isObject()) {
-        jField.clear();
-    } else {
-        jField = Json::Value();
-    }
-}
-
-}  // namespace
 
 TESSEL_OBJECT_VERSION::TESSEL_OBJECT_VERSION()
     : next(NULL), m_impl(new (std::nothrow) TESSEL_OBJECT_VERSION_PRIVATE) {}
@@ -64,77 +40,23 @@ void TESSEL_OBJECT_VERSION::clear() {
     d.author = 0;
     d.mtime = 0;
     d.version.clear();
-    Empty(d.commit_msg);
+    tessel::EmptyJson(d.commit_msg);
     if (d.last_version.isArray()) {
         d.last_version.clear();
     } else {
         d.last_version = Json::Value(Json::arrayValue);
     }
-    Empty(d.extra_info);
+    tessel::EmptyJson(d.extra_info);
 }
 
-// The same accessors as the object record's; a record that lost its data
-// block answers empty (or null, or 0) and refuses to store anything.
-#define TESSEL_VERSION_SETTER(X, ArgType)                \
-    bool TESSEL_OBJECT_VERSION::set_##X(ArgType v) {     \
-        if (NULL == m_impl) {                            \
-            return false;                                \
-        }                                                \
-        m_impl->X = v;                                   \
-        return true;                                     \
-    }
-
-#define TESSEL_VERSION_TEXT_FIELD(X)                              \
-    std::string TESSEL_OBJECT_VERSION::get_##X() const {          \
-        return m_impl ? m_impl->X : std::string();                \
-    }                                                             \
-    const std::string &TESSEL_OBJECT_VERSION::get_ref_##X() const { \
-        return m_impl ? m_impl->X : EmptyText();                  \
-    }                                                             \
-    TESSEL_VERSION_SETTER(X, const std::string &)
-
-#define TESSEL_VERSION_JSON_FIELD(X)                              \
-    Json::Value TESSEL_OBJECT_VERSION::get_##X() const {          \
-        return m_impl ? m_impl->X : Json::Value();                \
-    }                                                             \
-    const Json::Value &TESSEL_OBJECT_VERSION::get_ref_##X() const { \
-        return m_impl ? m_impl->X : NullJson();                   \
-    }                                                             \
-    TESSEL_VERSION_SETTER(X, const Json::Value &)                 \
-    bool TESSEL_OBJECT_VERSION::swap_##X(Json::Value &v) {        \
-        if (NULL == m_impl) {                                     \
-            return false;                                         \
-        }                                                         \
-        m_impl->X.swap(v);                                        \
-        return true;                                              \
-    }
-
-// The value is kept in 32 bits, as the version store records it.
-#define TESSEL_VERSION_INT_FIELD(X, ApiType, StoredType)          \
-    ApiType TESSEL_OBJECT_VERSION::get_##X() const {              \
-        return m_impl ? static_cast<ApiType>(m_impl->X) : 0;      \
-    }                                                             \
-    bool TESSEL_OBJECT_VERSION::set_##X(ApiType v) {              \
-        if (NULL == m_impl) {                                     \
-            return false;                                         \
-        }                                                         \
-        m_impl->X = static_cast<StoredType>(v);                   \
-        return true;                                              \
-    }
-
-TESSEL_VERSION_TEXT_FIELD(ns)
-TESSEL_VERSION_TEXT_FIELD(id)
-TESSEL_VERSION_INT_FIELD(author, unsigned long, uint32_t)
-TESSEL_VERSION_INT_FIELD(mtime, long, int32_t)
-TESSEL_VERSION_TEXT_FIELD(version)
-TESSEL_VERSION_JSON_FIELD(commit_msg)
-TESSEL_VERSION_JSON_FIELD(last_version)
-TESSEL_VERSION_JSON_FIELD(extra_info)
-
-#undef TESSEL_VERSION_SETTER
-#undef TESSEL_VERSION_TEXT_FIELD
-#undef TESSEL_VERSION_JSON_FIELD
-#undef TESSEL_VERSION_INT_FIELD
+TESSEL_RECORD_TEXT_FIELD(TESSEL_OBJECT_VERSION, ns)
+TESSEL_RECORD_TEXT_FIELD(TESSEL_OBJECT_VERSION, id)
+TESSEL_RECORD_INT_FIELD(TESSEL_OBJECT_VERSION, author, unsigned long, uint32_t)
+TESSEL_RECORD_INT_FIELD(TESSEL_OBJECT_VERSION, mtime, long, int32_t)
+TESSEL_RECORD_TEXT_FIELD(TESSEL_OBJECT_VERSION, version)
+TESSEL_RECORD_JSON_FIELD(TESSEL_OBJECT_VERSION, commit_msg)
+TESSEL_RECORD_JSON_FIELD(TESSEL_OBJECT_VERSION, last_version)
+TESSEL_RECORD_JSON_FIELD(TESSEL_OBJECT_VERSION, extra_info)
 
 extern "C" {
 
