@@ -30,184 +30,126 @@ namespace {
 constexpr const char kGetterModule[] = "include/tesselobjectgetter";
 constexpr const char kSetterModule[] = "include/tesselobjectsetter";
 
-typedef const std::string &(TESSEL_OBJECT::*TextRef)() const;
-typedef const Json::Value &(TESSEL_OBJECT::*JsonRef)() const;
-typedef bool (TESSEL_OBJECT::*TextSet)(const std::string &);
-typedef bool (TESSEL_OBJECT::*JsonSwap)(Json::Value &);
-
-int CheckBuffer(const char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    TESSEL_ITEM_CHECK(kGetterModule, NULL != szBuf, "__null != szBuf", 0);
-    TESSEL_ITEM_CHECK(kGetterModule, 0 < cbBuf, "0 < cbBuf", cbBuf);
-    TESSEL_ITEM_CHECK(kGetterModule, NULL != pObject, "NULL != pObject", 0);
-    return 0;
-}
-
-int GetText(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject, TextRef get) {
-    if (0 != CheckBuffer(szBuf, cbBuf, pObject)) {
-        return -1;
-    }
-    snprintf(szBuf, static_cast<size_t>(cbBuf), "%s", (pObject->*get)().c_str());
-    return 0;
-}
-
-int GetJson(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject, JsonRef get) {
-    if (0 != CheckBuffer(szBuf, cbBuf, pObject)) {
-        return -1;
-    }
-    snprintf(szBuf, static_cast<size_t>(cbBuf), "%s", tessel::toString((pObject->*get)()).c_str());
-    return 0;
-}
-
-template <typename T, typename Getter>
-int GetInteger(T *pVal, const TESSEL_OBJECT *pObject, Getter get) {
-    TESSEL_ITEM_CHECK(kGetterModule, NULL != pVal, "__null != pVal", 0);
-    TESSEL_ITEM_CHECK(kGetterModule, NULL != pObject, "NULL != pObject", 0);
-    *pVal = (pObject->*get)();
-    return 0;
-}
-
-// A record without its data block cannot hold the value: -1 without a
-// report, since no argument was wrong.
-int SetText(TESSEL_OBJECT *pObject, const char *szVal, TextSet set) {
-    TESSEL_ITEM_CHECK(kSetterModule, NULL != szVal, "__null != szVal", 0);
-    TESSEL_ITEM_CHECK(kSetterModule, NULL != pObject, "NULL != pObject", 0);
-    return (pObject->*set)(szVal) ? 0 : -1;
-}
-
-// Text that is not JSON is stored as what the parse left (null), without a
-// report: these setters guard only against missing arguments.
-int SetJson(TESSEL_OBJECT *pObject, const char *szVal, JsonSwap swap) {
-    TESSEL_ITEM_CHECK(kSetterModule, NULL != szVal, "__null != szVal", 0);
-    TESSEL_ITEM_CHECK(kSetterModule, NULL != pObject, "NULL != pObject", 0);
-    Json::Value jVal;
-    tessel::fromString(jVal, szVal);
-    return (pObject->*swap)(jVal) ? 0 : -1;
-}
-
-template <typename T, typename Setter>
-int SetInteger(TESSEL_OBJECT *pObject, T val, Setter set) {
-    TESSEL_ITEM_CHECK(kSetterModule, NULL != pObject, "__null != pObject", 0);
-    return (pObject->*set)(val) ? 0 : -1;
-}
+typedef tessel::ItemAccess<TESSEL_OBJECT, kGetterModule, kSetterModule> Item;
 
 }  // namespace
 
 extern "C" {
 
 int TesselObjectItemGetNameSpace(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_ns);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_ns);
 }
 int TesselObjectItemGetID(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_id);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_id);
 }
 int TesselObjectItemGetCategory(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_category);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_category);
 }
 int TesselObjectItemGetVersion(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_version);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_version);
 }
 int TesselObjectItemGetPerm(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_perm);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_perm);
 }
 int TesselObjectItemGetCommitMsg(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_commit_msg);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_commit_msg);
 }
 int TesselObjectItemGetParentID(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_parent_id);
+    return Item::GetText(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_parent_id);
 }
 int TesselObjectItemGetOwner(unsigned long *pVal, const TESSEL_OBJECT *pObject) {
-    return GetInteger(pVal, pObject, &TESSEL_OBJECT::get_owner);
+    return Item::GetInteger(pVal, pObject, &TESSEL_OBJECT::get_owner);
 }
 int TesselObjectItemGetMetaText(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_metatext);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_metatext);
 }
 int TesselObjectItemGetText(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_text);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_text);
 }
 int TesselObjectItemGetMetaBinary_info(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_metabinary_info);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_metabinary_info);
 }
 int TesselObjectItemGetBinary_info(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_binary_info);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_binary_info);
 }
 int TesselObjectItemGetPath_info(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_path_info);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_path_info);
 }
 int TesselObjectItemGetACL(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_acl);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_acl);
 }
 int TesselObjectItemGetCreateTime(long *pVal, const TESSEL_OBJECT *pObject) {
-    return GetInteger(pVal, pObject, &TESSEL_OBJECT::get_ctime);
+    return Item::GetInteger(pVal, pObject, &TESSEL_OBJECT::get_ctime);
 }
 int TesselObjectItemGetModifyTime(long *pVal, const TESSEL_OBJECT *pObject) {
-    return GetInteger(pVal, pObject, &TESSEL_OBJECT::get_mtime);
+    return Item::GetInteger(pVal, pObject, &TESSEL_OBJECT::get_mtime);
 }
 int TesselObjectItemGetExtraInfo(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_extra_info);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_extra_info);
 }
 int TesselObjectItemGetPerson(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_person);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_person);
 }
 int TesselObjectItemGetErr(char *szBuf, int cbBuf, const TESSEL_OBJECT *pObject) {
-    return GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_err);
+    return Item::GetJson(szBuf, cbBuf, pObject, &TESSEL_OBJECT::get_ref_err);
 }
 
 int TesselObjectItemSetNameSpace(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_ns);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_ns);
 }
 int TesselObjectItemSetID(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_id);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_id);
 }
 int TesselObjectItemSetCategory(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_category);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_category);
 }
 int TesselObjectItemSetVersion(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_version);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_version);
 }
 int TesselObjectItemSetPerm(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_perm);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_perm);
 }
 int TesselObjectItemSetCommitMsg(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_commit_msg);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_commit_msg);
 }
 int TesselObjectItemSetParentID(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetText(pObject, szVal, &TESSEL_OBJECT::set_parent_id);
+    return Item::SetText(pObject, szVal, &TESSEL_OBJECT::set_parent_id);
 }
 int TesselObjectItemSetOwner(TESSEL_OBJECT *pObject, unsigned long val) {
-    return SetInteger(pObject, val, &TESSEL_OBJECT::set_owner);
+    return Item::SetInteger(pObject, val, &TESSEL_OBJECT::set_owner);
 }
 int TesselObjectItemSetMetaText(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_metatext);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_metatext);
 }
 int TesselObjectItemSetText(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_text);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_text);
 }
 int TesselObjectItemSetMetaBinaryInfo(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_metabinary_info);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_metabinary_info);
 }
 int TesselObjectItemSetBinaryInfo(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_binary_info);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_binary_info);
 }
 int TesselObjectItemSetPathInfo(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_path_info);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_path_info);
 }
 int TesselObjectItemSetACL(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_acl);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_acl);
 }
 int TesselObjectItemSetCreateTime(TESSEL_OBJECT *pObject, long val) {
-    return SetInteger(pObject, val, &TESSEL_OBJECT::set_ctime);
+    return Item::SetInteger(pObject, val, &TESSEL_OBJECT::set_ctime);
 }
 int TesselObjectItemSetModifyTime(TESSEL_OBJECT *pObject, long val) {
-    return SetInteger(pObject, val, &TESSEL_OBJECT::set_mtime);
+    return Item::SetInteger(pObject, val, &TESSEL_OBJECT::set_mtime);
 }
 int TesselObjectItemSetExtraInfo(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_extra_info);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_extra_info);
 }
 int TesselObjectItemSetPerson(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_person);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_person);
 }
 int TesselObjectItemSetErr(TESSEL_OBJECT *pObject, const char *szVal) {
-    return SetJson(pObject, szVal, &TESSEL_OBJECT::swap_err);
+    return Item::SetJson(pObject, szVal, &TESSEL_OBJECT::swap_err);
 }
 
 }  // extern "C"
